@@ -1,0 +1,6 @@
+// KelvraSDK: include this header and link the import library (libKelvraSDK.dll.a).
+#pragma once
+
+#include "KelvraApi.h"
+#include "KelvraBytes.h"
+#include "KelvraStrings.h"

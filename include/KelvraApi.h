@@ -1,0 +1,9 @@
+// KELVRA_API marks what KelvraSDK.dll exports. Hosts include the headers as they are and get the
+// import declarations; the library defines KELVRA_BUILDING_LIBRARY while it compiles itself.
+#pragma once
+
+#if defined(KELVRA_BUILDING_LIBRARY)
+#define KELVRA_API __declspec(dllexport)
+#else
+#define KELVRA_API __declspec(dllimport)
+#endif

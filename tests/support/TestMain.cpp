@@ -1,0 +1,30 @@
+// Entry point of every test program: a crash must end the program with a message and an exit
+// code, never with a debugger or an error dialog waiting for someone.
+#include <gtest/gtest.h>
+
+#include <windows.h>
+
+#include <cstdio>
+
+namespace
+{
+
+LONG WINAPI ReportCrash(EXCEPTION_POINTERS* info)
+{
+    std::fprintf(stderr, "test program crashed: exception 0x%08lx at %p\n",
+                 static_cast<unsigned long>(info->ExceptionRecord->ExceptionCode),
+                 info->ExceptionRecord->ExceptionAddress);
+    std::fflush(stderr);
+    ::TerminateProcess(::GetCurrentProcess(), 3);
+    return EXCEPTION_EXECUTE_HANDLER;
+}
+
+} // namespace
+
+int main(int argc, char** argv)
+{
+    ::SetErrorMode(SEM_FAILCRITICALERRORS | SEM_NOGPFAULTERRORBOX | SEM_NOOPENFILEERRORBOX);
+    ::SetUnhandledExceptionFilter(&ReportCrash);
+    testing::InitGoogleTest(&argc, argv);
+    return RUN_ALL_TESTS();
+}

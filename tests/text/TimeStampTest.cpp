@@ -1,0 +1,86 @@
+#include "KelvraStrings.h"
+#include "text/TimeStamp.h"
+
+#include <gtest/gtest.h>
+
+#include <cwctype>
+
+using KelvraTime::FormatTimeStamp;
+using KelvraTime::StampStyle;
+
+namespace
+{
+
+SYSTEMTIME At(WORD year, WORD month, WORD day, WORD hour, WORD minute, WORD second, WORD ms)
+{
+    SYSTEMTIME time = {};
+    time.wYear = year;
+    time.wMonth = month;
+    time.wDay = day;
+    time.wDayOfWeek = 5;
+    time.wHour = hour;
+    time.wMinute = minute;
+    time.wSecond = second;
+    time.wMilliseconds = ms;
+    return time;
+}
+
+} // namespace
+
+TEST(TimeStamp, FormatsEachFieldAsDocumented)
+{
+    struct Case
+    {
+        SYSTEMTIME time;
+        const wchar_t* readable;
+        const wchar_t* compact;
+    };
+    const Case cases[] = {
+        {At(2026, 12, 4, 9, 5, 3, 7), L"04-12-2026 09:05:03.7", L"041220260905037"},
+        {At(2026, 12, 4, 9, 5, 3, 250), L"04-12-2026 09:05:03.250", L"04122026090503250"},
+        {At(2026, 12, 4, 9, 5, 3, 999), L"04-12-2026 09:05:03.999", L"04122026090503999"},
+        {At(2026, 12, 4, 9, 5, 3, 0), L"04-12-2026 09:05:03.0", L"041220260905030"},
+        {At(2031, 1, 2, 3, 4, 5, 60), L"02-01-2031 03:04:05.60", L"0201203103040560"},
+        {At(1999, 10, 31, 23, 59, 59, 10), L"31-10-1999 23:59:59.10", L"3110199923595910"},
+        {At(987, 6, 7, 0, 0, 0, 1), L"07-06-987 00:00:00.1", L"07069870000001"},
+    };
+    for (const Case& c : cases)
+    {
+        EXPECT_EQ(FormatTimeStamp(c.time, StampStyle::Readable), c.readable);
+        EXPECT_EQ(FormatTimeStamp(c.time, StampStyle::Compact), c.compact);
+    }
+}
+
+TEST(TimeStamp, CompactIsReadableWithoutSeparators)
+{
+    const SYSTEMTIME time = At(2026, 3, 9, 14, 7, 1, 42);
+    std::wstring readable = FormatTimeStamp(time, StampStyle::Readable);
+    std::wstring stripped;
+    for (wchar_t c : readable)
+        if (c != L'-' && c != L' ' && c != L':' && c != L'.')
+            stripped += c;
+    EXPECT_EQ(stripped, FormatTimeStamp(time, StampStyle::Compact));
+}
+
+TEST(TimeStamp, NowAndNowLocalReadTheClock)
+{
+    SYSTEMTIME before;
+    ::GetSystemTime(&before);
+    const std::wstring now = KelvraTime::Time::Now();
+    // "dd-MM-yyyy hh:mm:ss.f": fixed positions up to the milliseconds.
+    ASSERT_GE(now.size(), 21u);
+    ASSERT_LE(now.size(), 23u);
+    EXPECT_EQ(now[2], L'-');
+    EXPECT_EQ(now[5], L'-');
+    EXPECT_EQ(now[10], L' ');
+    EXPECT_EQ(now[13], L':');
+    EXPECT_EQ(now[16], L':');
+    EXPECT_EQ(now[19], L'.');
+    EXPECT_EQ(now.substr(6, 4), KelvraStrings::Strings::ToString(before.wYear));
+
+    const std::wstring local = KelvraTime::Time::NowLocal();
+    EXPECT_GE(local.size(), 15u);
+    EXPECT_LE(local.size(), 17u);
+    for (wchar_t c : local)
+        EXPECT_TRUE(std::iswdigit(c)) << static_cast<int>(c);
+}
