@@ -4,3 +4,4 @@
 #include "KelvraApi.h"
 #include "KelvraBytes.h"
 #include "KelvraStrings.h"
+#include "KelvraTrace.h"

@@ -1,5 +1,7 @@
 #include "KelvraStrings.h"
 
+#include "text/FormatV.h"
+
 #include <cerrno>
 #include <climits>
 #include <cstdarg>
@@ -31,27 +33,6 @@ int HexDigitValue(wchar_t c)
     return -1;
 }
 
-// Measures, then formats into a string of exactly that size. Both passes need their own copy
-// of the argument list.
-std::wstring FormatWide(const wchar_t* format, va_list args)
-{
-    std::wstring result;
-    if (format == nullptr)
-        return result;
-    va_list measureArgs;
-    va_copy(measureArgs, args);
-    const int count = _vscwprintf(format, measureArgs);
-    va_end(measureArgs);
-    if (count <= 0)
-        return result;
-    result.resize(static_cast<size_t>(count));
-    // The buffer of a std::wstring always has room for the terminator after size() characters.
-    if (vswprintf_s(&result[0], result.size() + 1, format, args) <= 0)
-        return std::wstring();
-    result.resize(std::wcslen(result.c_str()));
-    return result;
-}
-
 std::string FormatNarrow(const char* format, va_list args)
 {
     std::string result;
@@ -72,6 +53,27 @@ std::string FormatNarrow(const char* format, va_list args)
 
 } // namespace
 
+// Measures, then formats into a string of exactly that size. Both passes need their own copy
+// of the argument list.
+std::wstring FormatV(const wchar_t* format, va_list args)
+{
+    std::wstring result;
+    if (format == nullptr)
+        return result;
+    va_list measureArgs;
+    va_copy(measureArgs, args);
+    const int count = _vscwprintf(format, measureArgs);
+    va_end(measureArgs);
+    if (count <= 0)
+        return result;
+    result.resize(static_cast<size_t>(count));
+    // The buffer of a std::wstring always has room for the terminator after size() characters.
+    if (vswprintf_s(&result[0], result.size() + 1, format, args) <= 0)
+        return std::wstring();
+    result.resize(std::wcslen(result.c_str()));
+    return result;
+}
+
 Strings& Strings::operator=(const Strings&)
 {
     return *this;
@@ -81,7 +83,7 @@ std::wstring Strings::Format(const wchar_t* format, ...)
 {
     va_list args;
     va_start(args, format);
-    std::wstring result = FormatWide(format, args);
+    std::wstring result = FormatV(format, args);
     va_end(args);
     return result;
 }
