@@ -66,10 +66,10 @@ public:
     // file name", "Failed to find the process name". After a throw no session is open and no
     // file is left open.
     static void start(std::wstring name, bool append, bool perProcess);
-    // Frees the module list: from then on every module traces at the configured level, and a
-    // module name the configuration names later is ignored. The log file stays open and the
-    // configuration is not read again. Stopping before the library unloads avoids the exit
-    // notice on the debugger output.
+    // Frees the module list: from then on every module traces at the configured level (module
+    // names of a configuration read later are ignored, until a later start makes a new, empty
+    // list). The log file stays open and the configuration is not read again. Stopping before
+    // the library unloads avoids the exit notice on the debugger output.
     static void stop();
     // Take and release the trace lock (recursive, no time-out), for a host that wants several
     // lines together. Pair them on the same thread.
@@ -77,9 +77,9 @@ public:
     static void unlock();
 
     // Reads c:\keltrace\debug once per process (later calls return at once); a missing file
-    // means level 0 and no filter. Module names met while no list exists start a new list,
-    // unless Debug::stop has already run. Throws only std::bad_alloc; the file is then read
-    // again at the next call.
+    // means level 0 and no filter. Module names met while no list exists (configure called
+    // before start) start the list, so the filter holds once the session opens; after stop they
+    // are ignored. Throws only std::bad_alloc; the file is then read again at the next call.
     static void configure();
     // Module filter: true when no list exists, the list is empty, or it holds the name
     // (compared after lowering A-Z, nothing else: no trimming, no wildcards).
@@ -98,10 +98,10 @@ public:
     // settings: %s takes a wide string, %hs a narrow one, %d an int. Characters the C runtime's
     // current locale cannot write become '?'. Never throws, and leaves the calling thread's
     // last-error code and errno as they were. Null texts count as empty.
-    static void emit(const void* moduleBase, Levels threshold, const wchar_t* tag, const wchar_t* file, int line,
-                     const wchar_t* message, ...) noexcept;
-    static void emitV(const void* moduleBase, Levels threshold, const wchar_t* tag, const wchar_t* file, int line,
-                      const wchar_t* message, va_list args) noexcept;
+    static void emit(const void* moduleBase, Levels threshold, const wchar_t* tag, const wchar_t* file,
+                     int line, const wchar_t* message, ...) noexcept;
+    static void emitV(const void* moduleBase, Levels threshold, const wchar_t* tag, const wchar_t* file,
+                      int line, const wchar_t* message, va_list args) noexcept;
 
 private:
     static bool config();
@@ -152,10 +152,11 @@ constexpr std::size_t FileNameOffset(const wchar_t* path)
 } // namespace KelvraTraceDetail
 
 // The emitting source file's name without its directory, worked out at compile time.
-#define KELVRA_TRACE_FILE_                                                                                             \
-    (L"" __FILE__ + std::integral_constant<std::size_t, ::KelvraTraceDetail::FileNameOffset(L"" __FILE__)>::value)
+#define KELVRA_TRACE_FILE_                                                                                   \
+    (L"" __FILE__ +                                                                                          \
+     std::integral_constant<std::size_t, ::KelvraTraceDetail::FileNameOffset(L"" __FILE__)>::value)
 
-#define KELVRA_TRACE_LINE_(threshold, tag, ...)                                                                        \
+#define KELVRA_TRACE_LINE_(threshold, tag, ...)                                                              \
     ::Debug::emit(&__ImageBase, threshold, tag, KELVRA_TRACE_FILE_, __LINE__, L"" __VA_ARGS__)
 
 // KELVRA_TRC(message, ...), KELVRA_INF(message, ...), KELVRA_ERR(message, ...): one trace line

@@ -189,7 +189,8 @@ void Debug::emitV(const void* moduleBase, Levels threshold, const wchar_t* tag, 
                 {
                     HMODULE caller = static_cast<HMODULE>(const_cast<void*>(moduleBase));
                     if (KelvraTrace::IsModuleTraced(_modules, module(KelvraTrace::ModuleFilePath(caller))))
-                        WriteText(CLog::_log, KelvraTrace::BuildTraceLine(tag, now(), file, line, message, args));
+                        WriteText(CLog::_log,
+                                  KelvraTrace::BuildTraceLine(tag, now(), file, line, message, args));
                 }
             }
         }
@@ -251,7 +252,8 @@ void Debug::setFile(const std::wstring& path, bool append)
     if (!file)
         throw std::runtime_error("Debug::setFile fopen failed");
     // A process-name failure throws from here and closes the file on the way out.
-    WriteText(file.get(), Strings::Format(L"\n\n*****     NEW LOG SESSION [%s]     *****\n\n", process().c_str()));
+    WriteText(file.get(),
+              Strings::Format(L"\n\n*****     NEW LOG SESSION [%s]     *****\n\n", process().c_str()));
     CLog::_log = file.release();
 }
 

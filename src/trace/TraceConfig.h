@@ -10,7 +10,7 @@ namespace KelvraTrace
 
 struct TraceConfig
 {
-    int level = 0;                    // highest level word met, 0 when none
+    int level = 0;                     // highest level word met, 0 when none
     std::vector<std::wstring> modules; // every other line, lower-cased, in file order
 };
 

@@ -173,10 +173,13 @@ TEST_F(TraceEmission, ThreadsNeverInterleaveNorLoseLines)
     std::vector<std::thread> writers;
     for (int t = 0; t < threads; ++t)
     {
-        writers.emplace_back([t] {
-            for (int n = 0; n < linesEach; ++n)
-                KELVRA_TRC(L"thread %d line %d of a line long enough to be written in several pieces", t, n);
-        });
+        writers.emplace_back(
+            [t]
+            {
+                for (int n = 0; n < linesEach; ++n)
+                    KELVRA_TRC(L"thread %d line %d of a line long enough to be written in several pieces", t,
+                               n);
+            });
     }
     for (std::thread& writer : writers)
         writer.join();
@@ -200,10 +203,12 @@ TEST(TraceLock, HostLockHoldsBackOtherThreadsEvenWithoutASession)
     Debug::lock();
     KELVRA_TRC(L"the lock is recursive: its owner may trace");
     std::atomic<bool> traced(false);
-    std::thread other([&traced] {
-        KELVRA_TRC(L"waits for the lock");
-        traced = true;
-    });
+    std::thread other(
+        [&traced]
+        {
+            KELVRA_TRC(L"waits for the lock");
+            traced = true;
+        });
     ::Sleep(300);
     EXPECT_FALSE(traced);
     Debug::unlock();

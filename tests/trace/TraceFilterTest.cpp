@@ -25,7 +25,8 @@ protected:
     static Lines LinesWithConfiguration(const std::string& configuration)
     {
         WriteMarkerFile(L"debug", configuration);
-        RunChild({"start:net:1:0", "trc:t", "inf:i", "err:e", "sample-trc:t", "sample-inf:i", "sample-err:e"});
+        RunChild(
+            {"start:net:1:0", "trc:t", "inf:i", "err:e", "sample-trc:t", "sample-inf:i", "sample-err:e"});
         return TaggedMessages(ReadMarkerFile(L"net.log"));
     }
 };
@@ -35,8 +36,9 @@ protected:
 TEST_F(TraceConfigured, WithoutAFileEveryLineOfEveryModuleIsWritten)
 {
     RunChild({"start:net:1:0", "trc:t", "inf:i", "err:e", "sample-trc:t", "sample-inf:i", "sample-err:e"});
-    EXPECT_EQ(TaggedMessages(ReadMarkerFile(L"net.log")),
-              (Lines{"TRC host t", "INF host i", "ERR host e", "TRC sample t", "INF sample i", "ERR sample e"}));
+    EXPECT_EQ(
+        TaggedMessages(ReadMarkerFile(L"net.log")),
+        (Lines{"TRC host t", "INF host i", "ERR host e", "TRC sample t", "INF sample i", "ERR sample e"}));
 }
 
 TEST_F(TraceConfigured, HighestLevelWinsAcrossCrLfLines)
@@ -46,7 +48,8 @@ TEST_F(TraceConfigured, HighestLevelWinsAcrossCrLfLines)
 
 TEST_F(TraceConfigured, InfLetsInformationAndErrorsThrough)
 {
-    EXPECT_EQ(LinesWithConfiguration("inf"), (Lines{"INF host i", "ERR host e", "INF sample i", "ERR sample e"}));
+    EXPECT_EQ(LinesWithConfiguration("inf"),
+              (Lines{"INF host i", "ERR host e", "INF sample i", "ERR sample e"}));
 }
 
 TEST_F(TraceConfigured, ByteOrderMarkAndTrailingBlankTurnLevelWordsIntoModuleNames)

@@ -48,21 +48,21 @@ TEST(TraceConfigFile, LevelWordsAndModuleNames)
         {"warning", 2, {}},
         {"error", 3, {}},
         {"err", 3, {}},
-        {"warn\ninfo\n", 2, {}},           // the highest level wins, in any order
+        {"warn\ninfo\n", 2, {}}, // the highest level wins, in any order
         {"info\nerror\nwarn", 3, {}},
-        {"warn\r\ninfo\r\n", 2, {}},       // CR LF lines read like LF lines
+        {"warn\r\ninfo\r\n", 2, {}},           // CR LF lines read like LF lines
         {"INFO\nInfo", 0, {L"info", L"info"}}, // level words are case-sensitive
-        {"info ", 0, {L"info "}},          // no trimming
+        {"info ", 0, {L"info "}},              // no trimming
         {" info", 0, {L" info"}},
         {"\xEF\xBB\xBFinfo\n", 0, {L"\u00ef\u00bb\u00bfinfo"}}, // a byte-order mark is part of the line
         {"Sample\ninfo\n", 1, {L"sample"}},
-        {"info\n\n", 1, {L""}},            // an empty line is a module name
-        {"info\n", 1, {}},                 // a final line feed makes no empty line
+        {"info\n\n", 1, {L""}}, // an empty line is a module name
+        {"info\n", 1, {}},      // a final line feed makes no empty line
         {"\n", 0, {L""}},
         {"Sample.Net\nSAMPLE.NET\n", 0, {L"sample.net", L"sample.net"}}, // duplicates kept
-        {"a\rb\n", 0, {L"a\rb"}},          // a carriage return elsewhere stays
-        {"info\r", 0, {L"info\r"}},        // ...also at the very end
-        {"Caf\xC9\n", 0, {L"caf\u00c9"}},  // one byte, one character; only A-Z are lowered
+        {"a\rb\n", 0, {L"a\rb"}},                                        // a carriage return elsewhere stays
+        {"info\r", 0, {L"info\r"}},                                      // ...also at the very end
+        {"Caf\xC9\n", 0, {L"caf\u00c9"}},    // one byte, one character; only A-Z are lowered
         {std::string("inf\0o\n", 6), 1, {}}, // a line ends at a NUL byte, as a C string reader sees it
     };
     for (const Case& c : cases)

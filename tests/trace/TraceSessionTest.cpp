@@ -45,8 +45,8 @@ TEST(TraceSessionMarker, WithoutTheMarkerDirectoryNothingHappens)
 TEST_F(TraceSession, AppendsBannerAndLinesToTheFixedFile)
 {
     WriteMarkerFile(L"net.log", "old line\r\n");
-    const ChildResult run = RunChild({"start:net:1:0", "lasterror", "trc:first", "inf:second", "err:third", "format",
-                                      "start:other:0:1", "trc:after the second start", "session"});
+    const ChildResult run = RunChild({"start:net:1:0", "lasterror", "trc:first", "inf:second", "err:third",
+                                      "format", "start:other:0:1", "trc:after the second start", "session"});
     // The first line read the (missing) configuration file, which set the error codes: the
     // caller still sees its own.
     EXPECT_EQ(run.output, (Lines{"start:ok", "lasterror:42 errno 33", "start:ok", "session:open"}));
@@ -92,8 +92,8 @@ TEST_F(TraceSession, TruncatingSessionKeepsOtherWritersOut)
     WriteMarkerFile(L"shared.log", "content of an earlier run\r\n");
     const SharedEvent ready("KelvraTraceTestReady");
     const SharedEvent release("KelvraTraceTestRelease");
-    Child holder({"start:shared:0:0", "trc:holder", "signal:KelvraTraceTestReady", "wait:KelvraTraceTestRelease",
-                  "trc:holder again"});
+    Child holder({"start:shared:0:0", "trc:holder", "signal:KelvraTraceTestReady",
+                  "wait:KelvraTraceTestRelease", "trc:holder again"});
     ASSERT_TRUE(ready.Wait(60000));
 
     // Whatever their own mode, other processes cannot open the file for writing now.
@@ -113,9 +113,9 @@ TEST_F(TraceSession, TruncatingSessionKeepsOtherWritersOut)
 TEST_F(TraceSession, ProcessFileNameWithoutDotCannotStart)
 {
     const ChildCopy noDot(L"TraceChildNoDot");
-    const ChildResult run = RunChild(
-        {"start:net:1:1", "session", "start:nodot:0:0", "session", "open:nodot.log", "trc:lost"}, false,
-        noDot.Path());
+    const ChildResult run =
+        RunChild({"start:net:1:1", "session", "start:nodot:0:0", "session", "open:nodot.log", "trc:lost"},
+                 false, noDot.Path());
     const std::string failure = "start:Failed to find the dot extension in the process file name";
     // The per-process name fails before anything is opened; the fixed name after its file was
     // opened, which is closed again at once.
@@ -127,8 +127,8 @@ TEST_F(TraceSession, ProcessFileNameWithoutDotCannotStart)
 TEST_F(TraceSession, ProcessFileNameOfOnlyAnExtensionCannotStart)
 {
     const ChildCopy onlyExtension(L".exe");
-    const ChildResult run = RunChild({"start:net:1:1", "start:dotonly:0:0", "session", "open:dotonly.log"}, false,
-                                     onlyExtension.Path());
+    const ChildResult run = RunChild({"start:net:1:1", "start:dotonly:0:0", "session", "open:dotonly.log"},
+                                     false, onlyExtension.Path());
     const std::string failure = "start:Failed to find the process name";
     EXPECT_EQ(run.output, (Lines{failure, failure, "session:closed", "open:ok"}));
     EXPECT_EQ(MarkerFiles(), std::vector<std::wstring>{L"dotonly.log"});
@@ -145,7 +145,9 @@ TEST_F(TraceSession, NoExitNoticeAfterStopEvenWhenTheConfigurationNamesModules)
 {
     // Read after stop, the name starts no new list: every module keeps tracing.
     WriteMarkerFile(L"debug", "Sample.Net\n");
-    const ChildResult run = RunChild({"start:net:1:0", "stop", "trc:after stop", "sample-trc:after stop"}, true);
+    const ChildResult run =
+        RunChild({"start:net:1:0", "stop", "trc:after stop", "sample-trc:after stop"}, true);
     EXPECT_EQ(CountOf(run.debugStrings, kExitNotice), 0u);
-    EXPECT_EQ(TaggedMessages(ReadMarkerFile(L"net.log")), (Lines{"TRC host after stop", "TRC sample after stop"}));
+    EXPECT_EQ(TaggedMessages(ReadMarkerFile(L"net.log")),
+              (Lines{"TRC host after stop", "TRC sample after stop"}));
 }

@@ -193,8 +193,8 @@ Child::Child(const std::vector<std::string>& steps, bool debugged, const std::ws
     startup.hStdInput = nullptr;
     PROCESS_INFORMATION started = {};
     const DWORD flags = debugged ? DEBUG_ONLY_THIS_PROCESS : 0;
-    if (!::CreateProcessW(application.c_str(), &commandLine[0], nullptr, nullptr, TRUE, flags, nullptr, nullptr,
-                          &startup, &started))
+    if (!::CreateProcessW(application.c_str(), &commandLine[0], nullptr, nullptr, TRUE, flags, nullptr,
+                          nullptr, &startup, &started))
     {
         ADD_FAILURE() << "CreateProcessW error " << ::GetLastError();
         return;

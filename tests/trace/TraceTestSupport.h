@@ -61,8 +61,8 @@ struct ChildResult
 {
     DWORD processId = 0;
     DWORD exitCode = 0;
-    std::vector<std::string> output;        // standard output lines
-    std::vector<std::string> debugStrings;  // debugger output (only when debugged)
+    std::vector<std::string> output;       // standard output lines
+    std::vector<std::string> debugStrings; // debugger output (only when debugged)
 };
 
 // One TraceChild run with the given steps (see TraceChild.cpp). Started at construction, finished
@@ -86,7 +86,8 @@ private:
 };
 
 // Start, finish, expect exit code 0.
-ChildResult RunChild(const std::vector<std::string>& steps, bool debugged = false, const std::wstring& program = L"");
+ChildResult RunChild(const std::vector<std::string>& steps, bool debugged = false,
+                     const std::wstring& program = L"");
 
 // A named event the test sets and children wait for (or the other way round).
 class SharedEvent
