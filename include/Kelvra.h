@@ -5,3 +5,4 @@
 #include "KelvraBytes.h"
 #include "KelvraEventLog.h"
 #include "KelvraStrings.h"
+#include "KelvraTrace.h"
