@@ -3,4 +3,5 @@
 
 #include "KelvraApi.h"
 #include "KelvraBytes.h"
+#include "KelvraIni.h"
 #include "KelvraStrings.h"
