@@ -7,6 +7,7 @@
 
 #include <windows.h>
 
+#include <cerrno>
 #include <cstdio>
 
 namespace KelvraTest
@@ -27,7 +28,9 @@ IniTestFile::IniTestFile(const std::string& bytes)
 
 IniTestFile::~IniTestFile()
 {
-    _wremove(m_path.c_str());
+    // Fails while anyone still holds the file open.
+    if (_wremove(m_path.c_str()) != 0)
+        ADD_FAILURE() << "cannot remove the test file: errno " << errno;
 }
 
 } // namespace KelvraTest
