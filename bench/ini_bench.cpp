@@ -121,7 +121,7 @@ void PrintRow(const char* label, const Figures& figures)
 
 int main()
 {
-    const int runs = 3;
+    const int runs = 5;
     wchar_t folder[MAX_PATH + 1];
     const DWORD length = ::GetTempPathW(MAX_PATH + 1, folder);
     const std::wstring path = std::wstring(folder, length) + L"kelvra_ini_bench.ini";

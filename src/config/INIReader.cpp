@@ -15,9 +15,31 @@ using KelvraStrings::Strings;
 namespace
 {
 
+// One allocation per key: the reader builds a key for every pair it stores and every look-up.
+// The letters are lowered in place, as Strings::ToLower would do it, because ToLower hands back
+// a second copy.
+std::wstring BuildKey(const wchar_t* section, size_t sectionLength, const wchar_t* name, size_t nameLength)
+{
+    std::wstring key;
+    key.reserve(sectionLength + 1 + nameLength);
+    key.append(section, sectionLength).append(1, L'.').append(name, nameLength);
+    for (wchar_t& c : key)
+    {
+        if (c >= L'A' && c <= L'Z')
+            c = static_cast<wchar_t>(c + (L'a' - L'A'));
+    }
+    return key;
+}
+
 bool IsDigit(wchar_t c)
 {
     return c >= L'0' && c <= L'9';
+}
+
+// The characters besides digits that a decimal number can hold.
+bool IsNumberSign(wchar_t c)
+{
+    return c == L'.' || c == L'e' || c == L'E' || c == L'+' || c == L'-';
 }
 
 // Stored values never begin with white space, so a number has to begin with its sign or
@@ -81,7 +103,7 @@ bool ReadDecimal(const std::wstring& text, double& result)
         return false;
     // A narrow copy of the characters a number can hold; from_chars finds where it ends.
     std::string number;
-    for (; i < text.size() && (IsDigit(text[i]) || std::wcschr(L".eE+-", text[i]) != nullptr); ++i)
+    for (; i < text.size() && (IsDigit(text[i]) || IsNumberSign(text[i])); ++i)
         number += static_cast<char>(text[i]);
     double value = 0.0;
     const std::from_chars_result read = std::from_chars(number.data(), number.data() + number.size(), value);
@@ -154,9 +176,7 @@ bool INIReader::GetBoolean(std::wstring section, std::wstring name, bool default
 
 std::wstring INIReader::MakeKey(std::wstring section, std::wstring name)
 {
-    section += L'.';
-    section += name;
-    return Strings::ToLower(section);
+    return BuildKey(section.data(), section.size(), name.data(), name.size());
 }
 
 int INIReader::ValueHandler(void* user, const wchar_t* section, const wchar_t* name, const wchar_t* value)
@@ -164,6 +184,7 @@ int INIReader::ValueHandler(void* user, const wchar_t* section, const wchar_t* n
     if (value[0] == L'\0')
         return 1;
     INIReader* reader = static_cast<INIReader*>(user);
-    reader->m_values.try_emplace(MakeKey(section, name), value);
+    // Straight to BuildKey: MakeKey would first copy both texts into strings of their own.
+    reader->m_values.try_emplace(BuildKey(section, std::wcslen(section), name, std::wcslen(name)), value);
     return 1;
 }
