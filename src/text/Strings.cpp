@@ -1,7 +1,6 @@
 #include "KelvraStrings.h"
+#include "text/FormatArguments.h"
 
-#include <cerrno>
-#include <climits>
 #include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
@@ -31,46 +30,70 @@ int HexDigitValue(wchar_t c)
     return -1;
 }
 
-// Measures, then formats into a string of exactly that size. Both passes need their own copy
-// of the argument list.
-std::wstring FormatWide(const wchar_t* format, va_list args)
-{
-    std::wstring result;
-    if (format == nullptr)
-        return result;
-    va_list measureArgs;
-    va_copy(measureArgs, args);
-    const int count = _vscwprintf(format, measureArgs);
-    va_end(measureArgs);
-    if (count <= 0)
-        return result;
-    result.resize(static_cast<size_t>(count));
-    // The buffer of a std::wstring always has room for the terminator after size() characters.
-    if (vswprintf_s(&result[0], result.size() + 1, format, args) <= 0)
-        return std::wstring();
-    result.resize(std::wcslen(result.c_str()));
-    return result;
-}
+// The runtime's counting and bounded formatters, which follow Microsoft rules whatever the
+// compiler's printf mode.
+template <typename Char>
+struct Formatter;
 
-std::string FormatNarrow(const char* format, va_list args)
+template <>
+struct Formatter<wchar_t>
 {
-    std::string result;
+    static int Measure(const wchar_t* format, va_list args) { return _vscwprintf(format, args); }
+    static int Print(wchar_t* buffer, size_t capacity, const wchar_t* format, va_list args)
+    {
+        return vswprintf_s(buffer, capacity, format, args);
+    }
+};
+
+template <>
+struct Formatter<char>
+{
+    static int Measure(const char* format, va_list args) { return _vscprintf(format, args); }
+    static int Print(char* buffer, size_t capacity, const char* format, va_list args)
+    {
+        return vsprintf_s(buffer, capacity, format, args);
+    }
+};
+
+// Measures, then formats into a string of exactly that size. Each pass reads its own copy of the
+// argument list.
+template <typename Char>
+bool FormatWith(std::basic_string<Char>& out, const Char* format, va_list args)
+{
+    out.clear();
     if (format == nullptr)
-        return result;
-    va_list measureArgs;
-    va_copy(measureArgs, args);
-    const int count = _vscprintf(format, measureArgs);
-    va_end(measureArgs);
+        return false;
+    va_list pass;
+    va_copy(pass, args);
+    const int count = Formatter<Char>::Measure(format, pass);
+    va_end(pass);
     if (count <= 0)
-        return result;
-    result.resize(static_cast<size_t>(count));
-    if (vsprintf_s(&result[0], result.size() + 1, format, args) <= 0)
-        return std::string();
-    result.resize(std::strlen(result.c_str()));
-    return result;
+        return count == 0;
+    out.resize(static_cast<size_t>(count));
+    // The buffer of a std::basic_string always has room for the terminator after size() characters.
+    va_copy(pass, args);
+    const int written = Formatter<Char>::Print(&out[0], out.size() + 1, format, pass);
+    va_end(pass);
+    if (written <= 0)
+    {
+        out.clear();
+        return false;
+    }
+    out.resize(std::char_traits<Char>::length(out.c_str()));
+    return true;
 }
 
 } // namespace
+
+bool FormatArguments(std::wstring& out, const wchar_t* format, va_list args)
+{
+    return FormatWith(out, format, args);
+}
+
+bool FormatArguments(std::string& out, const char* format, va_list args)
+{
+    return FormatWith(out, format, args);
+}
 
 Strings& Strings::operator=(const Strings&)
 {
@@ -81,7 +104,8 @@ std::wstring Strings::Format(const wchar_t* format, ...)
 {
     va_list args;
     va_start(args, format);
-    std::wstring result = FormatWide(format, args);
+    std::wstring result;
+    FormatArguments(result, format, args);
     va_end(args);
     return result;
 }
@@ -90,7 +114,8 @@ std::string Strings::Format(const char* format, ...)
 {
     va_list args;
     va_start(args, format);
-    std::string result = FormatNarrow(format, args);
+    std::string result;
+    FormatArguments(result, format, args);
     va_end(args);
     return result;
 }
