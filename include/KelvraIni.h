@@ -20,10 +20,12 @@
 // - White space is U+0009..U+000D and U+0020 only: the bytes 0x85 and 0xA0 are kept, since in
 //   UTF-8 they end letters such as "Å" and "à".
 // - A read takes at most 199 characters and line numbers count reads, so a longer line uses one
-//   number per 199 characters. Only its first 199 characters are parsed; it is kept when it is
-//   a comment, a header closed there or a pair whose value ends at an inline comment there, and
-//   is a bad line otherwise (its value is never cut short, its tail never becomes a pair).
+//   number per 199 characters (a line of exactly 199 uses two: its line end is read alone).
+//   Only the first 199 characters of a longer line are parsed: it is kept when it is a comment,
+//   a header closed there or a pair whose value ends at an inline comment there, and is a bad
+//   line otherwise (its value is never cut short, its tail never becomes a pair).
 // - Section names and names longer than 49 characters are not cut: their line is bad.
+//
 // Queries only read the table: several threads may query one reader as long as none assigns to
 // it meanwhile.
 class KELVRA_API INIReader

@@ -254,7 +254,7 @@ TEST(IniParserLongLines, LongCommentIsSkippedAndCountsOneNumberPerRead)
     EXPECT_THAT(parsed.calls, ElementsAre(Call{L"", L"k", L"1"}));
 }
 
-TEST(IniParserLongLines, LongValueIsABadLineAndItsTailNoPair)
+TEST(IniParserLongLines, LongValueIsABadLineAndItsTailIsNoPair)
 {
     const std::string url = "url = http://host/" + std::string(250, 'p') + "?a=b&c=d\n";
     const Parsed parsed = Parse("first = 1\n" + url + "next = 2\n");
