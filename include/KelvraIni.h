@@ -9,7 +9,7 @@
 
 // File format, as the reader understands it:
 // - The file is read byte by byte in text mode: each byte becomes the character of the same
-//   value (UTF-8 is not decoded: "é" arrives as U+00C3 U+00A9), CR LF becomes LF and a byte
+//   value (UTF-8 is not decoded: U+00E9 arrives as U+00C3 U+00A9), CR LF becomes LF and a byte
 //   0x1A ends the file. A UTF-8 byte-order mark on the first line is skipped. This assumes the
 //   host keeps the C runtime's default "C" locale.
 // - "[section]" starts a section (blanks inside the brackets belong to the name); "name = value"
@@ -18,7 +18,7 @@
 // - ";" or "#" as the first non-blank character makes a comment line; ";" after a blank starts
 //   an inline comment. A line that begins with a blank continues the previous pair's value.
 // - White space is U+0009..U+000D and U+0020 only: the bytes 0x85 and 0xA0 are kept, since in
-//   UTF-8 they end letters such as "Å" and "à".
+//   UTF-8 they end letters such as U+00C5 and U+00E0.
 // - A read takes at most 199 characters and line numbers count reads, so a longer line uses one
 //   number per 199 characters (a line of exactly 199 uses two: its line end is read alone).
 //   Only the first 199 characters of a longer line are parsed: it is kept when it is a comment,

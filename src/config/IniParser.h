@@ -20,7 +20,7 @@ using IniHandler = int (*)(void* user, const wchar_t* section, const wchar_t* na
 // Beyond the usual INI rules:
 // - White space is U+0009..U+000D and U+0020 only. U+0085 and U+00A0 are not, because they
 //   arrive here as the bytes 0x85 and 0xA0, which are also the last bytes of UTF-8 letters
-//   such as "Å" and "à": stripping them would cut such letters in half.
+//   such as U+00C5 and U+00E0: stripping them would cut such letters in half.
 // - A section name or a pair's name longer than 49 characters makes its line bad: nothing is
 //   cut, and the current section and the previous name stay as they were.
 // - A physical line longer than 199 characters is read in pieces that keep one line number
