@@ -4,5 +4,6 @@
 #include "KelvraApi.h"
 #include "KelvraBytes.h"
 #include "KelvraEventLog.h"
+#include "KelvraIni.h"
 #include "KelvraStrings.h"
 #include "KelvraTrace.h"

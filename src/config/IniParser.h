@@ -1,0 +1,33 @@
+// The line parser behind INIReader: reads an INI file from an open stream and hands every
+// name/value pair to a handler.
+#pragma once
+
+#include <cstdio>
+
+namespace Kelvra
+{
+
+// Called for every pair and every continuation line with the user pointer given to
+// ParseIniStream. The texts are NUL-terminated and valid only during the call. Nonzero accepts
+// the pair; 0 makes its line bad (parsing goes on).
+using IniHandler = int (*)(void* user, const wchar_t* section, const wchar_t* name, const wchar_t* value);
+
+// Reads `stream` (opened in text mode: each byte of the file one wide character) to its end and
+// returns 0 when every line was accepted, otherwise the number of the first bad line. Line
+// numbers count reads of at most 199 characters, so a longer physical line takes one number per
+// piece. The stream stays open; a read error ends the parse like the end of the stream.
+//
+// Beyond the usual INI rules:
+// - White space is U+0009..U+000D and U+0020 only. U+0085 and U+00A0 are not, because they
+//   arrive here as the bytes 0x85 and 0xA0, which are also the last bytes of UTF-8 letters
+//   such as U+00C5 and U+00E0: stripping them would cut such letters in half.
+// - A section name or a pair's name longer than 49 characters makes its line bad: nothing is
+//   cut, and the current section and the previous name stay as they were.
+// - A physical line longer than 199 characters is read in pieces that keep one line number
+//   each, but only its first piece is parsed: a comment, a header closed there, or a pair
+//   whose value ends at an inline comment there is taken; anything else is a bad line. The
+//   other pieces are skipped rather than parsed as lines of their own, so the tail of a long
+//   value never turns into a pair.
+int ParseIniStream(std::FILE* stream, IniHandler handler, void* user);
+
+} // namespace Kelvra
