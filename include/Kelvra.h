@@ -3,4 +3,6 @@
 
 #include "KelvraApi.h"
 #include "KelvraBytes.h"
+#include "KelvraLocks.h"
 #include "KelvraStrings.h"
+#include "KelvraThread.h"
