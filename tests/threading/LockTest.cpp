@@ -1,5 +1,4 @@
 #include "KelvraLocks.h"
-#include "ThreadingSupport.h"
 
 #include <gtest/gtest.h>
 

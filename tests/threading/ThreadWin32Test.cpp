@@ -407,19 +407,6 @@ TEST(ThreadWin32, AssignmentTakesAHandleOfItsOwn)
     EXPECT_EQ(handlesBefore, OpenHandleCount());
 }
 
-TEST(ThreadWin32, SelfAssignmentKeepsTheThread)
-{
-    WorkerProbe probe;
-    Worker worker(probe, &WaitForStopEvent);
-    worker.StartAndWait();
-    const CThreadWin32& same = worker;
-    worker.CThreadWin32::operator=(same);
-    EXPECT_TRUE(worker.IsRunning());
-    EXPECT_EQ(THREAD_PRIORITY_NORMAL, worker.GetPriority());
-    worker.Stop(kPatientTimeout);
-    EXPECT_EQ(43u, probe.ExitCode(0));
-}
-
 TEST(ThreadWin32, ManyCyclesLeaveNoHandleOpen)
 {
     WorkerProbe probe;
