@@ -121,10 +121,10 @@ public:
     void Create();
     // Does nothing without a thread handle. Otherwise sets the stop request; called from the
     // worker itself, ends it at once with exit code 0xA5A5A5A5 (no return, no stack unwinding).
-    // Otherwise, when the running flag is set, waits up to timeout milliseconds (negative: no
-    // limit) for the thread to end and then terminates it with exit code 0xFFFFFFFD. Returns
-    // with the thread ended (unless it cannot be terminated), the running flag clear and the
-    // handle closed.
+    // Otherwise waits up to timeout milliseconds (negative: no limit) for the thread to end and,
+    // if Run was still running (running flag set), then terminates it with exit code 0xFFFFFFFD.
+    // Returns with the running flag clear, the handle closed and, unless the wait for a thread
+    // that had left Run ran out, the thread ended: the object may be destroyed at once.
     void Stop(int timeout);
     // Always throws the const wchar_t* literal "Thread suspend operation is not safe".
     unsigned long Suspend();
