@@ -5,5 +5,7 @@
 #include "KelvraBytes.h"
 #include "KelvraEventLog.h"
 #include "KelvraIni.h"
+#include "KelvraLocks.h"
 #include "KelvraStrings.h"
+#include "KelvraThread.h"
 #include "KelvraTrace.h"
