@@ -25,7 +25,7 @@ std::string ReadBinaryFile(const std::wstring& path)
     std::unique_ptr<FILE, int (*)(FILE*)> file(_wfopen(path.c_str(), L"rb"), &std::fclose);
     if (!file)
     {
-        ADD_FAILURE() << "cannot open a test data file";
+        ADD_FAILURE() << "cannot open a file the test needs";
         return std::string();
     }
     std::string content;

@@ -1,5 +1,7 @@
 #include "TraceTestSupport.h"
 
+#include "support/TestData.h"
+
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -97,18 +99,7 @@ void WriteMarkerFile(const std::wstring& fileName, const std::string& bytes)
 
 std::string ReadMarkerFile(const std::wstring& fileName)
 {
-    const Kelvra::UniqueFile file(::_wfopen(MarkerPath(fileName).c_str(), L"rb"));
-    if (!file)
-    {
-        ADD_FAILURE() << "cannot read " << Narrow(MarkerPath(fileName));
-        return std::string();
-    }
-    std::string content;
-    char buffer[65536];
-    size_t got;
-    while ((got = std::fread(buffer, 1, sizeof(buffer), file.get())) > 0)
-        content.append(buffer, got);
-    return content;
+    return KelvraTest::ReadBinaryFile(MarkerPath(fileName));
 }
 
 std::vector<TraceLine> ParseTraceLines(const std::string& text)
