@@ -4,6 +4,8 @@
 
 #include <windows.h>
 
+#include <algorithm>
+#include <array>
 #include <cstdio>
 
 namespace KelvraBench
@@ -29,6 +31,21 @@ double BestSeconds(int runs, Work&& work)
         const double elapsed = Seconds() - start;
         if (elapsed < best)
             best = elapsed;
+    }
+    return best;
+}
+
+// Best wall time of each work over `runs` rounds. Each round runs every work once, in turn, so
+// that a busy spell of the shared machine hits all of them alike and their ratios stay fair.
+template <typename... Works>
+std::array<double, sizeof...(Works)> BestSecondsInTurn(int runs, Works&&... works)
+{
+    std::array<double, sizeof...(Works)> best;
+    best.fill(1e300);
+    for (int run = 0; run < runs; ++run)
+    {
+        size_t index = 0;
+        ((best[index] = std::min(best[index], BestSeconds(1, works)), ++index), ...);
     }
     return best;
 }

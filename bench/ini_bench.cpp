@@ -94,23 +94,21 @@ Figures Measure(const std::wstring& path, bool documented, int runs)
     figures.keys = keys.size();
     figures.bytes = static_cast<double>(attributes.nFileSizeLow);
 
-    // The three measures take turns, so that a busy spell of the machine hits them alike.
     size_t lines = 0;
     int parseError = 0;
     size_t found = 0;
-    figures.readSeconds = figures.loadSeconds = figures.readerSeconds = 1e300;
-    for (int run = 0; run < runs; ++run)
-    {
-        figures.readSeconds = std::min(figures.readSeconds, BestSeconds(1, [&] { lines = ReadAllLines(path); }));
-        figures.loadSeconds =
-            std::min(figures.loadSeconds, BestSeconds(1, [&] { parseError = INIReader(path).ParseError(); }));
-        figures.readerSeconds = std::min(figures.readerSeconds, BestSeconds(1, [&] {
-                                             const INIReader reader(path);
-                                             found = 0;
-                                             for (const Key& key : keys)
-                                                 found += !reader.Get(key.first, key.second, std::wstring()).empty();
-                                         }));
-    }
+    const auto [readSeconds, loadSeconds, readerSeconds] = BestSecondsInTurn(
+        runs, [&] { lines = ReadAllLines(path); }, [&] { parseError = INIReader(path).ParseError(); },
+        [&]
+        {
+            const INIReader reader(path);
+            found = 0;
+            for (const Key& key : keys)
+                found += !reader.Get(key.first, key.second, std::wstring()).empty();
+        });
+    figures.readSeconds = readSeconds;
+    figures.loadSeconds = loadSeconds;
+    figures.readerSeconds = readerSeconds;
     _wremove(path.c_str());
     figures.correct = lines > 0 && parseError == 0 && found == keys.size();
     return figures;

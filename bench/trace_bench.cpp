@@ -72,26 +72,13 @@ template <typename Line> void WriteLines(int threads, Line& line)
         worker.join();
 }
 
-// Best seconds of kRuns runs each, the two cases taking turns so that a busy moment of the
-// shared machine does not favour either.
-template <typename First, typename Second>
-void CompareBestSeconds(First first, Second second, double& firstBest, double& secondBest)
-{
-    firstBest = secondBest = 1e300;
-    for (int run = 0; run < kRuns; ++run)
-    {
-        firstBest = std::min(firstBest, BestSeconds(1, first));
-        secondBest = std::min(secondBest, BestSeconds(1, second));
-    }
-}
-
 int Measure()
 {
     // With no session a line only takes and releases the trace lock: compare with a bare wait and
     // release of a mutex.
     HANDLE bare = ::CreateMutexW(nullptr, FALSE, nullptr);
-    double idleSeconds, bareSeconds;
-    CompareBestSeconds(
+    const auto [idleSeconds, bareSeconds] = BestSecondsInTurn(
+        kRuns,
         []
         {
             for (int i = 0; i < kIdleLines; ++i)
@@ -104,8 +91,7 @@ int Measure()
                 ::WaitForSingleObject(bare, INFINITE);
                 ::ReleaseMutex(bare);
             }
-        },
-        idleSeconds, bareSeconds);
+        });
     ::CloseHandle(bare);
 
     Debug::start(L"bench", false, true);
@@ -120,11 +106,10 @@ int Measure()
     auto rawLine = [&raw](int value) { RawLine(raw, value); };
 
     auto traceLine = [](int value) { TraceLine(value); };
-    double trace1Seconds, raw1Seconds, trace4Seconds, raw4Seconds;
-    CompareBestSeconds([&] { WriteLines(1, traceLine); }, [&] { WriteLines(1, rawLine); }, trace1Seconds,
-                       raw1Seconds);
-    CompareBestSeconds([&] { WriteLines(4, traceLine); }, [&] { WriteLines(4, rawLine); }, trace4Seconds,
-                       raw4Seconds);
+    const auto [trace1Seconds, raw1Seconds] =
+        BestSecondsInTurn(kRuns, [&] { WriteLines(1, traceLine); }, [&] { WriteLines(1, rawLine); });
+    const auto [trace4Seconds, raw4Seconds] =
+        BestSecondsInTurn(kRuns, [&] { WriteLines(4, traceLine); }, [&] { WriteLines(4, rawLine); });
     const double trace1 = kLines / trace1Seconds, raw1 = kLines / raw1Seconds;
     const double trace4 = kLines / trace4Seconds, raw4 = kLines / raw4Seconds;
     std::fclose(raw.file);
