@@ -3,6 +3,7 @@
 #include "http/RegexPattern.h"
 
 #include <new>
+#include <string_view>
 #include <unordered_set>
 
 bool ExtractPatternGroups(const std::wstring& pattern, const std::wstring& text, std::vector<std::wstring>& results)
@@ -18,9 +19,9 @@ bool ExtractPatternGroups(const std::wstring& pattern, const std::wstring& text,
         // One lowered copy for the whole scan; each match starts where the last one ended.
         const KelvraRegex::LoweredText lowered(text.c_str());
         CRegexMatchContext context(256);
-        // Lowered texts of the entries so far: a case-insensitive comparison with each of them
-        // in one look-up.
-        std::unordered_set<std::wstring> seen;
+        // The entries so far as they stand in the lowered copy: a case-insensitive comparison
+        // with each of them in one look-up.
+        std::unordered_set<std::wstring_view> seen;
         size_t from = 0;
         while (compiled.Match(lowered, from, context))
         {

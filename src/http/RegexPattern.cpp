@@ -1,11 +1,11 @@
 #include "http/RegexPattern.h"
 
 #include "http/RegexException.h"
-#include "KelvraStrings.h"
 
 #include <algorithm>
 #include <cwchar>
 #include <new>
+#include <string>
 
 using KelvraRegex::Instruction;
 using KelvraRegex::OpCode;
@@ -13,12 +13,16 @@ using KelvraRegex::OpCode;
 namespace KelvraRegex
 {
 
+// One pass and one allocation: this copy is made once per scan of a header block, which may be
+// large, so it does not go through Strings::ToLower and its extra copy.
 LoweredText::LoweredText(const wchar_t* original)
-    : m_original(original), m_length(std::wcslen(original)), m_lowered(original, m_length)
+    : m_original(original), m_length(std::wcslen(original)), m_lowered(m_length + 1, L'\0')
 {
-    KelvraStrings::Strings::ToLower(m_lowered);
-    // The string's own terminator follows this one.
-    m_lowered.push_back(L'\0');
+    for (size_t i = 0; i < m_length; ++i)
+    {
+        const wchar_t c = original[i];
+        m_lowered[i] = c >= L'A' && c <= L'Z' ? static_cast<wchar_t>(c - L'A' + L'a') : c;
+    }
 }
 
 } // namespace KelvraRegex
@@ -129,60 +133,100 @@ bool CRegexPattern::Match(const KelvraRegex::LoweredText& text, size_t from, CRe
     return matched;
 }
 
+namespace
+{
+
+// Where the next attempt may succeed: the first position from `from` on holding leading, or
+// `from` itself when the program has no leading character. length when there is none.
+size_t NextCandidate(const wchar_t* text, size_t length, size_t from, wchar_t leading)
+{
+    if (leading == L'\0' || from >= length)
+        return from;
+    const wchar_t* found = std::char_traits<wchar_t>::find(text + from, length - from, leading);
+    return found == nullptr ? length : static_cast<size_t>(found - text);
+}
+
+} // namespace
+
 // Every read of the text checks the position against length, so nothing past the terminator is
-// read whatever the program does.
+// read whatever the program does. The stack lives in locals while the program runs.
 bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexMatchContext& context,
                         size_t& position) const
 {
+    using Span = CRegexMatchContext::Span;
     const Instruction* const code = m_program.code.data();
     const size_t count = m_program.code.size();
+    const wchar_t leading = m_program.leadingChar;
     std::uint64_t* const slots = context.m_slots.data();
-    CRegexMatchContext::Span* const captures = context.m_captures.data();
-    size_t pos = from;
+    Span* const captures = context.m_captures.data();
+    std::uint64_t* stack = context.m_stack.data();
+    size_t capacity = context.m_stack.size();
+    size_t depth = 0;
     size_t pc = 0;
+    bool matched = false;
+
+    // An attempt that would fail at once on its leading character is not started at all.
+    size_t pos = NextCandidate(text, length, from, leading);
+    if (leading != L'\0' && pos >= length)
+    {
+        position = length;
+        return false;
+    }
+
+    const auto push = [&](std::uint64_t value) {
+        if (++depth >= capacity)
+        {
+            context.m_depth = depth - 1;
+            if (!context.Grow(depth))
+            {
+                --depth;
+                return false;
+            }
+            stack = context.m_stack.data();
+            capacity = context.m_stack.size();
+        }
+        stack[depth] = value;
+        return true;
+    };
+    // Entry 0 is never used: popping an empty stack yields 0.
+    const auto pop = [&]() -> std::uint64_t { return depth == 0 ? 0 : stack[depth--]; };
+
     for (;;)
     {
         if (pc >= count)
+        {
+            context.m_depth = depth;
             throw CRegexException(CRegexException::kInvalidArgument);
+        }
         if (pc == 0)
             context.m_matchStart = pos;
         const Instruction& instruction = code[pc];
-        bool failed = false;
+        const std::uint64_t operand = instruction.operand;
         switch (instruction.op)
         {
         case OpCode::Nop:
             ++pc;
-            break;
+            continue;
         case OpCode::Char:
             // Char 0 matches the terminator and steps past it.
-            if (pos > length || text[pos] != static_cast<wchar_t>(instruction.operand))
-            {
-                failed = true;
+            if (pos > length || text[pos] != static_cast<wchar_t>(operand))
                 break;
-            }
             ++pos;
             ++pc;
-            break;
+            continue;
         case OpCode::AnyChar:
             if (pos >= length)
-            {
-                failed = true;
                 break;
-            }
             ++pos;
             ++pc;
-            break;
+            continue;
         case OpCode::CharClass:
         case OpCode::NotCharClass:
         {
             if (pos >= length)
-            {
-                failed = true;
                 break;
-            }
             const std::uint64_t c = static_cast<std::uint16_t>(text[pos]);
-            const size_t after = static_cast<size_t>(instruction.operand);
-            const size_t boundsEnd = std::min(after, count);
+            const size_t boundsEnd = std::min(static_cast<size_t>(operand), count);
             bool inside = false;
             for (size_t bound = pc + 1; bound + 1 < boundsEnd; bound += 2)
             {
@@ -193,136 +237,127 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
                 }
             }
             if (inside != (instruction.op == OpCode::CharClass))
-            {
-                failed = true;
                 break;
-            }
             ++pos;
-            pc = after;
-            break;
+            pc = static_cast<size_t>(operand);
+            continue;
         }
         case OpCode::Jump:
-            pc = static_cast<size_t>(instruction.operand);
-            break;
+            pc = static_cast<size_t>(operand);
+            continue;
         case OpCode::Branch:
-            if (!context.Push(pc + 1))
-                return false;
-            pc = static_cast<size_t>(instruction.operand);
-            break;
+            // A target whose every way fails on this character would only be tried and undone.
+            if (pos <= length && !m_program.branchFirstChars[pc].Admits(text[pos]))
+            {
+                ++pc;
+                continue;
+            }
+            if (!push(pc + 1))
+                goto finished;
+            pc = static_cast<size_t>(operand);
+            continue;
         case OpCode::Backtrack:
-            failed = true;
             break;
         case OpCode::PushPos:
-            if (!context.Push(pos))
-                return false;
+            if (!push(pos))
+                goto finished;
             ++pc;
-            break;
+            continue;
         case OpCode::PopPos:
-            pos = static_cast<size_t>(context.Pop());
+            pos = static_cast<size_t>(pop());
             ++pc;
-            break;
+            continue;
         case OpCode::PushSlot:
-            if (!context.Push(slots[instruction.operand]))
-                return false;
+            if (!push(slots[operand]))
+                goto finished;
             ++pc;
-            break;
+            continue;
         case OpCode::PopSlot:
-            slots[instruction.operand] = context.Pop();
+            slots[operand] = pop();
             ++pc;
-            break;
+            continue;
         case OpCode::SavePos:
-            slots[instruction.operand] = pos;
+            slots[operand] = pos;
             ++pc;
-            break;
+            continue;
         case OpCode::SaveDepth:
-            slots[instruction.operand] = context.m_depth;
+            slots[operand] = depth;
             ++pc;
-            break;
+            continue;
         case OpCode::RestorePos:
-            pos = static_cast<size_t>(slots[instruction.operand]);
+            pos = static_cast<size_t>(slots[operand]);
             ++pc;
-            break;
+            continue;
         case OpCode::RestoreDepth:
-            context.m_depth = std::min(context.m_depth, static_cast<size_t>(slots[instruction.operand]));
+            depth = std::min(depth, static_cast<size_t>(slots[operand]));
             ++pc;
-            break;
+            continue;
         case OpCode::FailIfNoProgress:
-            if (pos == slots[instruction.operand])
-            {
-                failed = true;
+            if (pos == slots[operand])
                 break;
-            }
             ++pc;
-            break;
+            continue;
         case OpCode::GroupStart:
-            captures[instruction.operand].start = pos;
+            captures[operand].start = pos;
             ++pc;
-            break;
+            continue;
         case OpCode::GroupEnd:
-            captures[instruction.operand].end = pos;
+            captures[operand].end = pos;
             ++pc;
-            break;
+            continue;
         case OpCode::PushGroup:
-        {
-            const CRegexMatchContext::Span& span = captures[instruction.operand];
-            if (!context.Push(span.start) || !context.Push(span.end))
-                return false;
+            if (!push(captures[operand].start) || !push(captures[operand].end))
+                goto finished;
             ++pc;
-            break;
-        }
+            continue;
         case OpCode::PopGroup:
-        {
-            CRegexMatchContext::Span& span = captures[instruction.operand];
-            span.end = context.Pop();
-            span.start = context.Pop();
+            captures[operand].end = pop();
+            captures[operand].start = pop();
             ++pc;
-            break;
-        }
+            continue;
         case OpCode::BackRef:
         {
             // A capture not complete (no end yet, or an end left from an earlier turn before
             // its new start) counts as empty.
-            const CRegexMatchContext::Span& span = captures[instruction.operand];
+            const Span& span = captures[operand];
             const bool complete = span.start != CRegexMatchContext::kNull &&
                                   span.end != CRegexMatchContext::kNull && span.end > span.start;
             const size_t n = complete ? static_cast<size_t>(span.end - span.start) : 0;
-            for (size_t i = 0; i < n; ++i)
-            {
-                if (pos + i >= length || text[pos + i] != text[span.start + i])
-                {
-                    failed = true;
-                    break;
-                }
-            }
-            if (failed)
+            size_t i = 0;
+            while (i < n && pos + i < length && text[pos + i] == text[span.start + i])
+                ++i;
+            if (i < n)
                 break;
             pos += n;
             ++pc;
-            break;
+            continue;
         }
         case OpCode::Advance:
         {
             // No attempt starts at the end of a non-empty text, nor past the end of an empty one.
-            const size_t next = static_cast<size_t>(context.m_matchStart) + 1;
+            const size_t next = NextCandidate(text, length, static_cast<size_t>(context.m_matchStart) + 1, leading);
             if (next >= length)
             {
-                position = length;
-                return false;
+                pos = length;
+                goto finished;
             }
-            context.m_depth = 0;
+            depth = 0;
             pos = next;
             pc = 0;
-            break;
+            continue;
         }
         case OpCode::Stop:
-            position = pos;
-            return false;
+            goto finished;
         case OpCode::Accept:
             context.m_matchEnd = pos;
-            position = pos;
-            return true;
+            matched = true;
+            goto finished;
         }
-        if (failed)
-            pc = static_cast<size_t>(context.Pop());
+        // Every case that does not continue has failed: backtrack.
+        pc = static_cast<size_t>(pop());
     }
+finished:
+    context.m_depth = depth;
+    position = pos;
+    return matched;
 }

@@ -30,7 +30,8 @@ public:
     explicit LoweredText(const wchar_t* original);
 
     const wchar_t* Original() const { return m_original; }
-    // Followed by two NULs, so that one step past the end of the text still reads a terminator.
+    // Followed by two NULs (its own and the string's), so that one step past the end of the text
+    // still reads a terminator.
     const wchar_t* Lowered() const { return m_lowered.c_str(); }
     size_t Length() const { return m_length; }
 
@@ -85,18 +86,8 @@ private:
     const wchar_t* At(std::uint64_t offset) const { return offset == kNull ? nullptr : m_text + offset; }
     // Fresh captures and slots for a match over text; false when memory runs out.
     bool Prepare(std::uint32_t groupCount, std::uint32_t slotCount, const wchar_t* text);
-    // False when the stack is full and cannot grow: nothing may be lost.
-    bool Push(std::uint64_t value)
-    {
-        const size_t depth = m_depth + 1;
-        if (depth >= m_stack.size() && !Grow(depth))
-            return false;
-        m_stack[depth] = value;
-        m_depth = depth;
-        return true;
-    }
-    // Entry 0 is never used: popping an empty stack yields 0.
-    std::uint64_t Pop() { return m_depth == 0 ? 0 : m_stack[m_depth--]; }
+    // Makes room for an entry at depth; false when the stack cannot grow (the match then ends:
+    // no entry may be lost).
     bool Grow(size_t depth);
 
     std::uint32_t m_groupCount = 0;

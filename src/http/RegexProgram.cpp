@@ -1,5 +1,7 @@
 #include "http/RegexProgram.h"
 
+#include <algorithm>
+
 namespace KelvraRegex
 {
 
@@ -225,7 +227,113 @@ void Builder::EmitLazyLoop(const Node& body)
     PointAt(branch, Here());
 }
 
+// The first characters of the ways from instruction start. Instructions that move nothing are
+// followed; both ways of a Branch count, since every resume point of the templates either fails
+// or restores the position the Branch saw. Anything that can succeed, or restore a position,
+// without consuming (Accept, a look-ahead, a back-reference) makes the answer Anything.
+FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start)
+{
+    FirstChars first;
+    std::vector<bool> visited(code.size(), false);
+    std::vector<size_t> pending{start};
+    while (!pending.empty())
+    {
+        const size_t at = pending.back();
+        pending.pop_back();
+        if (at >= code.size())
+            return FirstChars::Anything();
+        if (visited[at])
+            continue;
+        visited[at] = true;
+        const Instruction& instruction = code[at];
+        const wchar_t operand = static_cast<wchar_t>(instruction.operand);
+        switch (instruction.op)
+        {
+        case OpCode::Char:
+            first.AddRange(operand, operand);
+            break;
+        case OpCode::AnyChar:
+            first.AddRange(1, 0xFFFF);
+            break;
+        case OpCode::CharClass:
+        case OpCode::NotCharClass:
+        {
+            FirstChars items;
+            for (size_t bound = at + 1; bound + 1 < instruction.operand && bound + 1 < code.size(); bound += 2)
+                items.AddRange(static_cast<wchar_t>(code[bound].operand), static_cast<wchar_t>(code[bound + 1].operand));
+            if (instruction.op == OpCode::CharClass)
+                first.Add(items);
+            else
+                first.AddAllBut(items);
+            break;
+        }
+        case OpCode::Jump:
+            pending.push_back(static_cast<size_t>(instruction.operand));
+            break;
+        case OpCode::Branch:
+            pending.push_back(static_cast<size_t>(instruction.operand));
+            pending.push_back(at + 1);
+            break;
+        case OpCode::Backtrack:
+            break;
+        case OpCode::Nop:
+        case OpCode::PushPos:
+        case OpCode::PopPos:
+        case OpCode::PushSlot:
+        case OpCode::PopSlot:
+        case OpCode::SavePos:
+        case OpCode::SaveDepth:
+        case OpCode::FailIfNoProgress:
+        case OpCode::GroupStart:
+        case OpCode::GroupEnd:
+        case OpCode::PushGroup:
+        case OpCode::PopGroup:
+            pending.push_back(at + 1);
+            break;
+        case OpCode::RestorePos:
+        case OpCode::RestoreDepth:
+        case OpCode::BackRef:
+        case OpCode::Advance:
+        case OpCode::Stop:
+        case OpCode::Accept:
+            return FirstChars::Anything();
+        }
+    }
+    return first;
+}
+
 } // namespace
+
+FirstChars FirstChars::Anything()
+{
+    FirstChars anything;
+    anything.m_anything = true;
+    return anything;
+}
+
+void FirstChars::AddRange(wchar_t low, wchar_t high)
+{
+    for (unsigned c = low; c <= high && c < 128; ++c)
+        m_ascii[c >> 6] |= std::uint64_t{1} << (c & 63);
+    if (high >= 128)
+        m_beyondAscii = true;
+}
+
+void FirstChars::AddAllBut(const FirstChars& excluded)
+{
+    // Any character but the excluded ones and the end of the text.
+    m_ascii[0] |= ~excluded.m_ascii[0] & ~std::uint64_t{1};
+    m_ascii[1] |= ~excluded.m_ascii[1];
+    m_beyondAscii = true;
+}
+
+void FirstChars::Add(const FirstChars& other)
+{
+    m_anything = m_anything || other.m_anything;
+    m_beyondAscii = m_beyondAscii || other.m_beyondAscii;
+    m_ascii[0] |= other.m_ascii[0];
+    m_ascii[1] |= other.m_ascii[1];
+}
 
 Program BuildProgram(const SyntaxTree& tree)
 {
@@ -237,6 +345,19 @@ Program BuildProgram(const SyntaxTree& tree)
     program.code.push_back(Instruction{tree.anchored ? OpCode::Stop : OpCode::Advance, 0});
     builder.Emit(*tree.root);
     program.code.push_back(Instruction{OpCode::Accept, 0});
+    if (!tree.anchored && program.code[2].op == OpCode::Char)
+        program.leadingChar = static_cast<wchar_t>(program.code[2].operand);
+    // A way that fails can still leave a capture end behind (GroupEnd is undone only when the
+    // whole group is backtracked out of), and a back-reference inside the group sees it: with
+    // back-references every way is tried.
+    program.branchFirstChars.assign(program.code.size(), FirstChars::Anything());
+    const bool backReferences = std::any_of(program.code.begin(), program.code.end(),
+                                            [](const Instruction& instruction) { return instruction.op == OpCode::BackRef; });
+    for (size_t at = 0; at < program.code.size() && !backReferences; ++at)
+    {
+        if (program.code[at].op == OpCode::Branch)
+            program.branchFirstChars[at] = FirstCharsFrom(program.code, static_cast<size_t>(program.code[at].operand));
+    }
     return program;
 }
 

@@ -47,11 +47,44 @@ struct Instruction
     std::uint64_t operand;
 };
 
+// The characters with which a way through the program from some instruction can begin, when
+// every such way must consume one before it can succeed. The matcher skips a choice whose ways
+// all fail on the character at hand: that changes nothing it reports, only the work.
+class FirstChars
+{
+public:
+    // A new object admits nothing; Anything() admits every character (nothing is known).
+    static FirstChars Anything();
+
+    bool Admits(wchar_t c) const
+    {
+        if (m_anything)
+            return true;
+        if (c < 128)
+            return (m_ascii[c >> 6] >> (c & 63)) & 1;
+        return m_beyondAscii;
+    }
+
+    void AddRange(wchar_t low, wchar_t high);
+    void AddAllBut(const FirstChars& excluded);
+    void Add(const FirstChars& other);
+
+private:
+    bool m_anything = false;
+    bool m_beyondAscii = false;
+    std::uint64_t m_ascii[2] = {0, 0};
+};
+
 struct Program
 {
     std::vector<Instruction> code;
     std::uint32_t groupCount = 0;
     std::uint32_t slotCount = 0;
+    // The character every attempt must find at its start when the pattern begins with a literal
+    // (and is not anchored); 0 otherwise. Attempts at other positions would fail at once.
+    wchar_t leadingChar = 0;
+    // For each Branch instruction, the first characters of the ways through its target.
+    std::vector<FirstChars> branchFirstChars;
 };
 
 // Builds the program of a tree that ParseRegex accepted. Throws std::bad_alloc.

@@ -63,8 +63,9 @@ struct Node
     Quantifier quantifier = Quantifier::Star;
     bool lazy = false;
     std::vector<std::unique_ptr<Node>> children;
-    // Whether the compiler treats the construct as able to match the empty string (this decides
-    // compile error 9); a back-reference and a look-ahead count as their own kind says.
+    // Whether the compiler counts the construct as able to match the empty string; this decides
+    // compile error 9. A back-reference counts as not, a look-ahead as its atom does, and every
+    // lazy quantifier as able to.
     bool canBeEmpty = false;
     // Whether it really can finish without consuming text: also true for back-references (an
     // empty capture) and look-aheads. Lazy loops over such a body need a progress check.

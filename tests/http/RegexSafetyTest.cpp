@@ -3,14 +3,14 @@
 #include "http/PatternExtraction.h"
 #include "http/ReferenceMatcher.h"
 #include "http/RegexPattern.h"
+#include "common/UniqueHandle.h"
 
 #include <gtest/gtest.h>
 
-#include <chrono>
-#include <future>
+#include <windows.h>
+
 #include <memory>
 #include <string>
-#include <thread>
 #include <vector>
 
 using KelvraTest::AgreesWithReference;
@@ -25,26 +25,44 @@ struct Outcome
     std::wstring match;
 };
 
+struct MatchJob
+{
+    std::wstring pattern;
+    std::wstring text;
+    Outcome outcome;
+};
+
+DWORD WINAPI RunMatchJob(void* parameter)
+{
+    // The thread holds its own reference: the job outlives a test that stopped waiting.
+    const std::unique_ptr<std::shared_ptr<MatchJob>> owner(static_cast<std::shared_ptr<MatchJob>*>(parameter));
+    MatchJob& job = **owner;
+    CRegexPattern compiled;
+    CRegexMatchContext context(256, 1 << 22);
+    if (compiled.Parse(job.pattern.c_str()) == 0 && compiled.Match(job.text.c_str(), context))
+    {
+        job.outcome.matched = true;
+        job.outcome.match.assign(context.MatchStart(), context.MatchEnd());
+    }
+    return 0;
+}
+
 // Matches on a worker thread, so that a matcher that never ends fails this test instead of
-// stalling the whole program. The worker owns copies of everything it uses.
+// stalling the whole program.
 bool MatchesWithin(const std::wstring& pattern, const std::wstring& text, Outcome& outcome)
 {
-    auto task = std::make_shared<std::packaged_task<Outcome()>>([pattern, text] {
-        CRegexPattern compiled;
-        CRegexMatchContext context(256, 1 << 22);
-        Outcome result;
-        if (compiled.Parse(pattern.c_str()) == 0 && compiled.Match(text.c_str(), context))
-        {
-            result.matched = true;
-            result.match.assign(context.MatchStart(), context.MatchEnd());
-        }
-        return result;
-    });
-    std::future<Outcome> future = task->get_future();
-    std::thread([task] { (*task)(); }).detach();
-    if (future.wait_for(std::chrono::seconds(30)) != std::future_status::ready)
+    const auto job = std::make_shared<MatchJob>(MatchJob{pattern, text, Outcome()});
+    auto* reference = new std::shared_ptr<MatchJob>(job);
+    Kelvra::UniqueThread thread(::CreateThread(nullptr, 0, &RunMatchJob, reference, 0, nullptr));
+    if (!thread)
+    {
+        delete reference;
+        ADD_FAILURE() << "CreateThread failed";
         return false;
-    outcome = future.get();
+    }
+    if (::WaitForSingleObject(thread.get(), 30000) != WAIT_OBJECT_0)
+        return false;
+    outcome = job->outcome;
     return true;
 }
 
