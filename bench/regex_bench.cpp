@@ -20,8 +20,9 @@ namespace
 using Entries = std::vector<std::wstring>;
 
 const wchar_t* const kPatterns[] = {
-    KelvraHeaderPatterns::kCharset,  KelvraHeaderPatterns::kContentLength, KelvraHeaderPatterns::kLocation,
-    KelvraHeaderPatterns::kLocationValue, KelvraHeaderPatterns::kCookies,
+    KelvraHeaderPatterns::kCharset,  KelvraHeaderPatterns::kContentLength,
+    KelvraHeaderPatterns::kLocation, KelvraHeaderPatterns::kLocationValue,
+    KelvraHeaderPatterns::kCookies,
 };
 
 // The same five in ECMAScript syntax. "." of our matcher also takes CR and LF, "\n" is a line end.
@@ -60,8 +61,9 @@ std::wstring RealisticBlock()
                  L"' https://cdn.example.com; style-src 'self' 'unsafe-inline'; img-src * data:; "
                  L"connect-src 'self' https://api.example.com wss://push.example.com\r\n";
     }
-    const wchar_t* const cookieNames[] = {L"sessionid", L"csrftoken", L"_ga", L"_gid", L"lang", L"theme",
-                                          L"consent", L"ab_test", L"tracking", L"cart", L"region", L"tz"};
+    const wchar_t* const cookieNames[] = {L"sessionid", L"csrftoken", L"_ga",     L"_gid",
+                                          L"lang",      L"theme",     L"consent", L"ab_test",
+                                          L"tracking",  L"cart",      L"region",  L"tz"};
     for (int i = 0; block.size() < 8192 - 200; ++i)
     {
         block += L"Set-Cookie: " + std::wstring(cookieNames[i % 12]) + std::to_wstring(i) +
@@ -77,7 +79,8 @@ std::wstring RealisticBlock()
 // 20,000 distinct Set-Cookie lines of 52 characters: a hostile 1 MiB.
 std::wstring CookieFlood()
 {
-    std::wstring block = L"HTTP/1.1 200 OK\r\nContent-Type: text/html; charset=utf-8\r\nContent-Length: 0\r\n";
+    std::wstring block =
+        L"HTTP/1.1 200 OK\r\nContent-Type: text/html; charset=utf-8\r\nContent-Length: 0\r\n";
     for (int i = 0; i < 20000; ++i)
     {
         wchar_t line[64];
@@ -135,7 +138,8 @@ std::wstring Lowered(std::wstring text)
 }
 
 // Every match's group 1, each once ignoring case, as ExtractPatternGroups collects group 0.
-void ExtractStandard(const std::vector<std::wregex>& patterns, const std::wstring& block, std::vector<Entries>& results)
+void ExtractStandard(const std::vector<std::wregex>& patterns, const std::wstring& block,
+                     std::vector<Entries>& results)
 {
     results.assign(patterns.size(), Entries());
     for (size_t i = 0; i < patterns.size(); ++i)
@@ -192,10 +196,12 @@ int main()
     const bool floodSame = ours == theirs;
     const Figures normalOurs = Measure(normal, 20, scratch);
     const Figures adversarialOurs = Measure(adversarial, 20, scratch);
-    const bool adversarialEmpty = scratch[0].empty() && scratch[1].empty() && scratch[2].empty() && scratch[4].empty();
+    const bool adversarialEmpty =
+        scratch[0].empty() && scratch[1].empty() && scratch[2].empty() && scratch[4].empty();
 
-    std::printf("Header field extraction, the five header patterns per block (MB/s of header text, one byte a "
-                "character; best of several runs)\n");
+    std::printf(
+        "Header field extraction, the five header patterns per block (MB/s of header text, one byte a "
+        "character; best of several runs)\n");
     std::printf("  %-40s %10s %12s %12s\n", "block", "size", "Kelvra", "std::wregex");
     std::printf("  %-40s %9.0fK %12.1f %12.2f\n", "realistic response", realistic.size() / 1024.0,
                 realisticOurs.megabytesPerSecond, realisticTheirs.megabytesPerSecond);
@@ -203,21 +209,22 @@ int main()
                 floodOurs.megabytesPerSecond, floodTheirs.megabytesPerSecond);
     std::printf("  %-40s %9.0fK %12.1f %12s\n", "normal (realistic blocks repeated)", normal.size() / 1024.0,
                 normalOurs.megabytesPerSecond, "-");
-    std::printf("  %-40s %9.0fK %12.1f %12s\n", "near misses, 60 KiB unended cookie line", adversarial.size() / 1024.0,
-                adversarialOurs.megabytesPerSecond, "-");
+    std::printf("  %-40s %9.0fK %12.1f %12s\n", "near misses, 60 KiB unended cookie line",
+                adversarial.size() / 1024.0, adversarialOurs.megabytesPerSecond, "-");
     std::printf("Ratios\n");
     bool met = true;
     const double realisticPerByte = realisticOurs.seconds / static_cast<double>(realistic.size());
     const double floodPerByte = floodOurs.seconds / static_cast<double>(flood.size());
     met &= ReportTarget("time per byte, 1 MiB / 8 KiB block", floodPerByte / realisticPerByte, "<=", 2);
-    met &= ReportTarget("time, near misses / normal 64 KiB block", adversarialOurs.seconds / normalOurs.seconds, "<=",
-                        10);
+    met &= ReportTarget("time, near misses / normal 64 KiB block",
+                        adversarialOurs.seconds / normalOurs.seconds, "<=", 10);
     met &= ReportTarget("throughput / std::wregex, 8 KiB block",
                         realisticOurs.megabytesPerSecond / realisticTheirs.megabytesPerSecond, ">=", 3);
     met &= ReportTarget("throughput / std::wregex, 1 MiB block",
                         floodOurs.megabytesPerSecond / floodTheirs.megabytesPerSecond, ">=", 3);
     std::printf("Results: same entries as std::wregex: %s (8 KiB), %s (1 MiB, %zu cookies); near misses give "
                 "nothing: %s\n",
-                realisticSame ? "yes" : "NO", floodSame ? "yes" : "NO", floodCookies, adversarialEmpty ? "yes" : "NO");
+                realisticSame ? "yes" : "NO", floodSame ? "yes" : "NO", floodCookies,
+                adversarialEmpty ? "yes" : "NO");
     return met && realisticSame && floodSame && adversarialEmpty && floodCookies == 20000 ? 0 : 1;
 }

@@ -6,7 +6,8 @@
 #include <string_view>
 #include <unordered_set>
 
-bool ExtractPatternGroups(const std::wstring& pattern, const std::wstring& text, std::vector<std::wstring>& results)
+bool ExtractPatternGroups(const std::wstring& pattern, const std::wstring& text,
+                          std::vector<std::wstring>& results)
 {
     results.clear();
     if (pattern.empty() || text.empty())

@@ -15,7 +15,8 @@
 // costs one pass plus the work of its matches. (An attempt of the cookie pattern runs on to the
 // next line end: a long text with many "Set-Cookie:" and no line end at all takes time in the
 // square of its length. WinHTTP ends every line of a header block with CR LF.)
-bool ExtractPatternGroups(const std::wstring& pattern, const std::wstring& text, std::vector<std::wstring>& results);
+bool ExtractPatternGroups(const std::wstring& pattern, const std::wstring& text,
+                          std::vector<std::wstring>& results);
 
 // text without the leading and trailing characters that occur in set; an empty set leaves it whole.
 std::wstring TrimChars(const std::wstring& text, const std::wstring& set);

@@ -173,7 +173,8 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
         return false;
     }
 
-    const auto push = [&](std::uint64_t value) {
+    const auto push = [&](std::uint64_t value)
+    {
         if (++depth >= capacity)
         {
             context.m_depth = depth - 1;
@@ -335,7 +336,8 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
         case OpCode::Advance:
         {
             // No attempt starts at the end of a non-empty text, nor past the end of an empty one.
-            const size_t next = NextCandidate(text, length, static_cast<size_t>(context.m_matchStart) + 1, leading);
+            const size_t next =
+                NextCandidate(text, length, static_cast<size_t>(context.m_matchStart) + 1, leading);
             if (next >= length)
             {
                 pos = length;

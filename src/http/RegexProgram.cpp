@@ -259,8 +259,10 @@ FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start)
         case OpCode::NotCharClass:
         {
             FirstChars items;
-            for (size_t bound = at + 1; bound + 1 < instruction.operand && bound + 1 < code.size(); bound += 2)
-                items.AddRange(static_cast<wchar_t>(code[bound].operand), static_cast<wchar_t>(code[bound + 1].operand));
+            for (size_t bound = at + 1; bound + 1 < instruction.operand && bound + 1 < code.size();
+                 bound += 2)
+                items.AddRange(static_cast<wchar_t>(code[bound].operand),
+                               static_cast<wchar_t>(code[bound + 1].operand));
             if (instruction.op == OpCode::CharClass)
                 first.Add(items);
             else
@@ -351,12 +353,14 @@ Program BuildProgram(const SyntaxTree& tree)
     // whole group is backtracked out of), and a back-reference inside the group sees it: with
     // back-references every way is tried.
     program.branchFirstChars.assign(program.code.size(), FirstChars::Anything());
-    const bool backReferences = std::any_of(program.code.begin(), program.code.end(),
-                                            [](const Instruction& instruction) { return instruction.op == OpCode::BackRef; });
+    const bool backReferences =
+        std::any_of(program.code.begin(), program.code.end(),
+                    [](const Instruction& instruction) { return instruction.op == OpCode::BackRef; });
     for (size_t at = 0; at < program.code.size() && !backReferences; ++at)
     {
         if (program.code[at].op == OpCode::Branch)
-            program.branchFirstChars[at] = FirstCharsFrom(program.code, static_cast<size_t>(program.code[at].operand));
+            program.branchFirstChars[at] =
+                FirstCharsFrom(program.code, static_cast<size_t>(program.code[at].operand));
     }
     return program;
 }

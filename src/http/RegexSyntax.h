@@ -14,28 +14,28 @@ enum CompileError : int
 {
     kCompiled = 0,
     kOutOfMemory = 1,
-    kCaptureNotClosed = 2,  // '}' expected
-    kGroupNotClosed = 3,    // ')' expected
-    kClassNotClosed = 4,    // ']' expected, or a range without its high end
+    kCaptureNotClosed = 2, // '}' expected
+    kGroupNotClosed = 3,   // ')' expected
+    kClassNotClosed = 4,   // ']' expected, or a range without its high end
     kAbbreviationFailed = 5,
     kEmptyClass = 6,
-    kUnknownGroup = 7,      // back-reference to a group not opened yet
+    kUnknownGroup = 7, // back-reference to a group not opened yet
     kReversedRange = 8,
-    kRepeatedEmpty = 9,     // '*', '+', '*?' or '+?' on something that can match nothing
+    kRepeatedEmpty = 9, // '*', '+', '*?' or '+?' on something that can match nothing
 };
 
 enum class NodeKind
 {
-    Sequence,   // children: the units, in order
-    Char,       // character; 0 is the end of the text
+    Sequence, // children: the units, in order
+    Char,     // character; 0 is the end of the text
     AnyChar,
-    Class,      // ranges, negated
-    Capture,    // group; children[0]: its sequence
-    Group,      // children[0]: its sequence
-    NotAhead,   // children[0]: the atom that must not match here
+    Class,       // ranges, negated
+    Capture,     // group; children[0]: its sequence
+    Group,       // children[0]: its sequence
+    NotAhead,    // children[0]: the atom that must not match here
     Alternation, // children[0] tried first, then children[1]
-    Repeat,     // children[0] repeated as quantifier and lazy say
-    BackRef,    // group
+    Repeat,      // children[0] repeated as quantifier and lazy say
+    BackRef,     // group
 };
 
 enum class Quantifier

@@ -44,8 +44,8 @@ TEST(HeaderBlocks, FieldsOfATypicalResponse)
     EXPECT_EQ(Extract(kLocation, block), Entries{L"1234"});
     EXPECT_EQ(Extract(kLocationValue, block), Entries{L"1234"});
     // The upper-case repeat of the first cookie is left out; blanks and tabs after the colon go.
-    EXPECT_EQ(Extract(kCookies, block),
-              (Entries{L"sid=31d4d96e407aad42; Path=/; Secure; HttpOnly", L"lang=en-US; Path=/", L"theme=dark"}));
+    EXPECT_EQ(Extract(kCookies, block), (Entries{L"sid=31d4d96e407aad42; Path=/; Secure; HttpOnly",
+                                                 L"lang=en-US; Path=/", L"theme=dark"}));
 }
 
 TEST(HeaderBlocks, LastCookieLineWithoutLineEndGivesNoEntry)
@@ -72,7 +72,8 @@ TEST(HeaderBlocks, ResponseWithoutCharsetOrNumericLocation)
 TEST(HeaderBlocks, LowerCaseContentLengthOfZero)
 {
     const std::wstring block = FetchHeaderBlock(RespondPath({L"content-length: 0"}));
-    ASSERT_NE(block.find(L"\r\ncontent-length: 0\r\n"), std::wstring::npos) << "the header's case was changed";
+    ASSERT_NE(block.find(L"\r\ncontent-length: 0\r\n"), std::wstring::npos)
+        << "the header's case was changed";
     EXPECT_EQ(Extract(kContentLength, block), Entries{L"0"});
 }
 

@@ -68,15 +68,17 @@ std::wstring FetchHeaderBlock(const std::wstring& path)
     const unsigned short port = LocalServerPort();
     if (port == 0)
         return std::wstring();
-    Kelvra::UniqueWinHttp session(
-        ::WinHttpOpen(L"KelvraTests", WINHTTP_ACCESS_TYPE_NO_PROXY, WINHTTP_NO_PROXY_NAME, WINHTTP_NO_PROXY_BYPASS, 0));
-    Kelvra::UniqueWinHttp connection(session ? ::WinHttpConnect(session.get(), L"127.0.0.1", port, 0) : nullptr);
-    Kelvra::UniqueWinHttp request(connection ? ::WinHttpOpenRequest(connection.get(), L"GET", path.c_str(), nullptr,
-                                                                     WINHTTP_NO_REFERER,
-                                                                     WINHTTP_DEFAULT_ACCEPT_TYPES, 0)
+    Kelvra::UniqueWinHttp session(::WinHttpOpen(L"KelvraTests", WINHTTP_ACCESS_TYPE_NO_PROXY,
+                                                WINHTTP_NO_PROXY_NAME, WINHTTP_NO_PROXY_BYPASS, 0));
+    Kelvra::UniqueWinHttp connection(session ? ::WinHttpConnect(session.get(), L"127.0.0.1", port, 0)
                                              : nullptr);
-    if (!request || !::WinHttpSendRequest(request.get(), WINHTTP_NO_ADDITIONAL_HEADERS, 0, WINHTTP_NO_REQUEST_DATA, 0,
-                                          0, 0) ||
+    Kelvra::UniqueWinHttp request(connection ? ::WinHttpOpenRequest(connection.get(), L"GET", path.c_str(),
+                                                                    nullptr, WINHTTP_NO_REFERER,
+                                                                    WINHTTP_DEFAULT_ACCEPT_TYPES, 0)
+                                             : nullptr);
+    if (!request ||
+        !::WinHttpSendRequest(request.get(), WINHTTP_NO_ADDITIONAL_HEADERS, 0, WINHTTP_NO_REQUEST_DATA, 0, 0,
+                              0) ||
         !::WinHttpReceiveResponse(request.get(), nullptr))
     {
         const DWORD error = ::GetLastError();

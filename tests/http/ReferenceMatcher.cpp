@@ -49,10 +49,12 @@ ReferenceResult ReferenceMatcher::Search(size_t from)
     for (size_t start = from;; ++start)
     {
         size_t end = 0;
-        if (Match(*m_tree.root, start, [&end](size_t pos) {
-                end = pos;
-                return true;
-            }))
+        if (Match(*m_tree.root, start,
+                  [&end](size_t pos)
+                  {
+                      end = pos;
+                      return true;
+                  }))
             return ReferenceResult{true, start, end, m_captures};
         if (m_tree.anchored || start + 1 >= m_text.size())
             return ReferenceResult{};
@@ -86,10 +88,12 @@ bool ReferenceMatcher::Match(const Node& node, size_t pos, const Next& next)
         // The capture is set on the way in and out, and given back only when the group fails.
         const ReferenceSpan before = m_captures[node.group];
         m_captures[node.group].start = pos;
-        if (Match(*node.children[0], pos, [&](size_t end) {
-                m_captures[node.group].end = end;
-                return next(end);
-            }))
+        if (Match(*node.children[0], pos,
+                  [&](size_t end)
+                  {
+                      m_captures[node.group].end = end;
+                      return next(end);
+                  }))
             return true;
         m_captures[node.group] = before;
         return false;
@@ -137,9 +141,11 @@ bool ReferenceMatcher::MatchRepeat(const Node& repeat, size_t pos, const Next& n
     case Quantifier::Star:
         return repeat.lazy ? LazyTurns(repeat, pos, next) : GreedyTurns(repeat, pos, next, true);
     case Quantifier::Plus:
-        return Match(body, pos, [&](size_t end) {
-            return repeat.lazy ? LazyTurns(repeat, end, next) : GreedyTurns(repeat, end, next, true);
-        });
+        return Match(body, pos,
+                     [&](size_t end) {
+                         return repeat.lazy ? LazyTurns(repeat, end, next)
+                                            : GreedyTurns(repeat, end, next, true);
+                     });
     case Quantifier::Optional:
         if (repeat.lazy)
             return next(pos) || Match(body, pos, next);
@@ -151,9 +157,9 @@ bool ReferenceMatcher::MatchRepeat(const Node& repeat, size_t pos, const Next& n
 // One more turn first; a turn that consumed nothing fails.
 bool ReferenceMatcher::GreedyTurns(const Node& repeat, size_t pos, const Next& next, bool again)
 {
-    if (Match(*repeat.children[0], pos, [&](size_t end) {
-            return end != pos && (again ? GreedyTurns(repeat, end, next, true) : next(end));
-        }))
+    if (Match(*repeat.children[0], pos,
+              [&](size_t end)
+              { return end != pos && (again ? GreedyTurns(repeat, end, next, true) : next(end)); }))
         return true;
     return next(pos);
 }
@@ -163,7 +169,8 @@ bool ReferenceMatcher::LazyTurns(const Node& repeat, size_t pos, const Next& nex
 {
     if (next(pos))
         return true;
-    return Match(*repeat.children[0], pos, [&](size_t end) { return end != pos && LazyTurns(repeat, end, next); });
+    return Match(*repeat.children[0], pos,
+                 [&](size_t end) { return end != pos && LazyTurns(repeat, end, next); });
 }
 
 std::vector<std::wstring> ReferenceExtract(const std::wstring& pattern, const std::wstring& text, bool* threw)
@@ -243,22 +250,24 @@ testing::AssertionResult AgreesWithReference(const std::wstring& pattern, const 
     const size_t start = static_cast<size_t>(context.MatchStart() - text.c_str());
     const size_t end = static_cast<size_t>(context.MatchEnd() - text.c_str());
     if (start != expected.start || end != expected.end)
-        return failure << "engine matches [" << start << ", " << end << "), reference [" << expected.start << ", "
-                       << expected.end << ")";
+        return failure << "engine matches [" << start << ", " << end << "), reference [" << expected.start
+                       << ", " << expected.end << ")";
     for (std::uint32_t group = 0; group < tree.groupCount; ++group)
     {
         const CRegexMatchContext::Capture capture = context.Group(group);
-        const size_t captureStart =
-            capture.start == nullptr ? ReferenceSpan::kNone : static_cast<size_t>(capture.start - text.c_str());
+        const size_t captureStart = capture.start == nullptr
+                                        ? ReferenceSpan::kNone
+                                        : static_cast<size_t>(capture.start - text.c_str());
         const size_t captureEnd =
             capture.end == nullptr ? ReferenceSpan::kNone : static_cast<size_t>(capture.end - text.c_str());
         const ReferenceSpan& span = expected.captures[group];
         const bool spanSet = span.start != ReferenceSpan::kNone && span.end != ReferenceSpan::kNone;
         if (captureStart != (spanSet ? span.start : ReferenceSpan::kNone) ||
             captureEnd != (spanSet ? span.end : ReferenceSpan::kNone))
-            return failure << "group " << group << ": engine [" << static_cast<long long>(captureStart) << ", "
-                           << static_cast<long long>(captureEnd) << "), reference ["
-                           << static_cast<long long>(span.start) << ", " << static_cast<long long>(span.end) << ")";
+            return failure << "group " << group << ": engine [" << static_cast<long long>(captureStart)
+                           << ", " << static_cast<long long>(captureEnd) << "), reference ["
+                           << static_cast<long long>(span.start) << ", " << static_cast<long long>(span.end)
+                           << ")";
     }
     return testing::AssertionSuccess();
 }

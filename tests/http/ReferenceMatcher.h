@@ -58,7 +58,8 @@ private:
 // ExtractPatternGroups done the slow, literal way: for every search position a fresh lowered
 // copy of the rest of the text, and a case-insensitive comparison with each earlier entry.
 // Sets *threw when the engine is expected to throw (a match, but no capture group).
-std::vector<std::wstring> ReferenceExtract(const std::wstring& pattern, const std::wstring& text, bool* threw);
+std::vector<std::wstring> ReferenceExtract(const std::wstring& pattern, const std::wstring& text,
+                                           bool* threw);
 
 // Runs CRegexPattern::Match and the reference matcher on the same pattern and text and compares
 // whether they match, where the match lies and every capture. A pattern that does not compile

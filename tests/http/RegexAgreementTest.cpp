@@ -57,7 +57,10 @@ public:
 private:
     unsigned Below(unsigned bound) { return static_cast<unsigned>(m_random() % bound); }
 
-    wchar_t Pick(const std::wstring& choices) { return choices[Below(static_cast<unsigned>(choices.size()))]; }
+    wchar_t Pick(const std::wstring& choices)
+    {
+        return choices[Below(static_cast<unsigned>(choices.size()))];
+    }
 
     std::wstring Raw()
     {
@@ -204,7 +207,8 @@ TEST(RegexAgreement, RandomExtractionsMatchTheLiteralAlgorithm)
             pattern = L"{" + pattern + L"}";
         for (int t = 0; t < 3 && failures < 10; ++t)
         {
-            const testing::AssertionResult agreed = ExtractionAgreesWithReference(pattern, generator.Text(12));
+            const testing::AssertionResult agreed =
+                ExtractionAgreesWithReference(pattern, generator.Text(12));
             if (!agreed)
             {
                 ADD_FAILURE() << agreed.message();

@@ -35,7 +35,8 @@ struct MatchJob
 DWORD WINAPI RunMatchJob(void* parameter)
 {
     // The thread holds its own reference: the job outlives a test that stopped waiting.
-    const std::unique_ptr<std::shared_ptr<MatchJob>> owner(static_cast<std::shared_ptr<MatchJob>*>(parameter));
+    const std::unique_ptr<std::shared_ptr<MatchJob>> owner(
+        static_cast<std::shared_ptr<MatchJob>*>(parameter));
     MatchJob& job = **owner;
     CRegexPattern compiled;
     CRegexMatchContext context(256, 1 << 22);
@@ -127,12 +128,8 @@ TEST(RegexSafety, LazyLoopOverABodyThatConsumesNothingEnds)
     // A back-reference to an empty capture and a look-ahead pass the compile-time check but
     // consume nothing; each turn over them must still move or end the loop.
     const Case cases[] = {
-        {L"{a?}\\0*?b", L"c", nullptr},
-        {L"{a?}\\0*?b", L"cb", L"b"},
-        {L"{x?}\\0+?y", L"z", nullptr},
-        {L"(!a)*?b", L"cc", nullptr},
-        {L"(!a)*?b", L"cb", L"b"},
-        {L"!a+?b", L"c", nullptr},
+        {L"{a?}\\0*?b", L"c", nullptr},   {L"{a?}\\0*?b", L"cb", L"b"}, {L"{x?}\\0+?y", L"z", nullptr},
+        {L"(!a)*?b", L"cc", nullptr},     {L"(!a)*?b", L"cb", L"b"},    {L"!a+?b", L"c", nullptr},
         {L"{a}\\0*?c", L"aaac", L"aaac"},
     };
     for (const Case& row : cases)
@@ -213,7 +210,8 @@ TEST(RegexSafety, StackGrowsForLongRuns)
 {
     const std::wstring digits(200000, L'7');
     std::vector<std::wstring> results;
-    ASSERT_TRUE(ExtractPatternGroups(L"Content-Length: {[0-9]+}", L"Content-Length: " + digits + L"\r\n", results));
+    ASSERT_TRUE(
+        ExtractPatternGroups(L"Content-Length: {[0-9]+}", L"Content-Length: " + digits + L"\r\n", results));
     ASSERT_EQ(results.size(), 1u);
     EXPECT_EQ(results[0], digits);
 }
