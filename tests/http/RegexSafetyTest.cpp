@@ -67,6 +67,28 @@ bool MatchesWithin(const std::wstring& pattern, const std::wstring& text, Outcom
     return true;
 }
 
+struct EndingCase
+{
+    const wchar_t* pattern;
+    const wchar_t* text;
+    const wchar_t* match; // nullptr: no match
+};
+
+// The match must end (within MatchesWithin's time limit), find what is expected and agree with
+// the reference matcher.
+void ExpectEndsAsTheReferenceDoes(const EndingCase& row)
+{
+    SCOPED_TRACE("pattern " + Printable(row.pattern) + " text " + Printable(row.text));
+    Outcome outcome;
+    ASSERT_TRUE(MatchesWithin(row.pattern, row.text, outcome)) << "the matcher does not end";
+    ASSERT_EQ(outcome.matched, row.match != nullptr);
+    if (outcome.matched)
+    {
+        EXPECT_EQ(outcome.match, row.match);
+    }
+    EXPECT_TRUE(AgreesWithReference(row.pattern, row.text));
+}
+
 } // namespace
 
 TEST(RegexSafety, TrailingBackslashStandsForItself)
@@ -119,61 +141,29 @@ TEST(RegexSafety, EmptyTextGetsOneAttempt)
 
 TEST(RegexSafety, LazyLoopOverABodyThatConsumesNothingEnds)
 {
-    struct Case
-    {
-        const wchar_t* pattern;
-        const wchar_t* text;
-        const wchar_t* match; // nullptr: no match
-    };
     // A back-reference to an empty capture and a look-ahead pass the compile-time check but
     // consume nothing; each turn over them must still move or end the loop.
-    const Case cases[] = {
+    const EndingCase cases[] = {
         {L"{a?}\\0*?b", L"c", nullptr},   {L"{a?}\\0*?b", L"cb", L"b"}, {L"{x?}\\0+?y", L"z", nullptr},
         {L"(!a)*?b", L"cc", nullptr},     {L"(!a)*?b", L"cb", L"b"},    {L"!a+?b", L"c", nullptr},
         {L"{a}\\0*?c", L"aaac", L"aaac"},
     };
-    for (const Case& row : cases)
-    {
-        SCOPED_TRACE("pattern " + Printable(row.pattern) + " text " + Printable(row.text));
-        Outcome outcome;
-        ASSERT_TRUE(MatchesWithin(row.pattern, row.text, outcome)) << "the matcher does not end";
-        ASSERT_EQ(outcome.matched, row.match != nullptr);
-        if (outcome.matched)
-        {
-            EXPECT_EQ(outcome.match, row.match);
-        }
-        EXPECT_TRUE(AgreesWithReference(row.pattern, row.text));
-    }
+    for (const EndingCase& row : cases)
+        ExpectEndsAsTheReferenceDoes(row);
 }
 
 TEST(RegexSafety, GreedyLoopBackAtItsTurnStartEnds)
 {
-    struct Case
-    {
-        const wchar_t* pattern;
-        const wchar_t* text;
-        const wchar_t* match; // nullptr: no match
-    };
     // After a second turn gives up, the first turn's body finds a way that consumes nothing. That
     // turn must fail: were it held to where it first ended instead of where it began, the loop
     // would start the same turn again, forever.
-    const Case cases[] = {
+    const EndingCase cases[] = {
         {L"(b*!x)*bc", L"bc", L"bc"},
         {L"{b*\\0}*a", L"b", nullptr},
         {L"{b*\\0}*a", L"bba", L"bba"},
     };
-    for (const Case& row : cases)
-    {
-        SCOPED_TRACE("pattern " + Printable(row.pattern) + " text " + Printable(row.text));
-        Outcome outcome;
-        ASSERT_TRUE(MatchesWithin(row.pattern, row.text, outcome)) << "the matcher does not end";
-        ASSERT_EQ(outcome.matched, row.match != nullptr);
-        if (outcome.matched)
-        {
-            EXPECT_EQ(outcome.match, row.match);
-        }
-        EXPECT_TRUE(AgreesWithReference(row.pattern, row.text));
-    }
+    for (const EndingCase& row : cases)
+        ExpectEndsAsTheReferenceDoes(row);
 }
 
 TEST(RegexSafety, EmptyMatchesMoveTheSearchForward)
