@@ -1,15 +1,22 @@
-// A file with given bytes in the temporary folder, removed again when the test is done.
+// Test helpers for INI files: every test writes its file byte for byte and reads it from disk.
 #pragma once
 
+#include "KelvraIni.h"
+
 #include <string>
+#include <vector>
 
 namespace KelvraTest
 {
 
+// The temporary folder, ending in a backslash.
+std::wstring TemporaryFolder();
+
+// A file in the temporary folder holding exactly the given bytes, removed again on destruction.
+// Every instance uses the same name: one at a time.
 class IniTestFile
 {
 public:
-    // Writes the bytes exactly as given (binary mode); fails the calling test if it cannot.
     explicit IniTestFile(const std::string& bytes);
     ~IniTestFile();
     IniTestFile(const IniTestFile&) = delete;
@@ -20,5 +27,18 @@ public:
 private:
     std::wstring m_path;
 };
+
+INIReader ReadIni(const std::string& bytes);
+
+// One look-up and the value it should give; a null value means that nothing is stored.
+struct IniValue
+{
+    const wchar_t* section;
+    const wchar_t* name;
+    const wchar_t* value;
+};
+
+// Reads the bytes through INIReader and expects firstError as ParseError() and every value as given.
+void ExpectIniValues(const std::string& bytes, const std::vector<IniValue>& values, int firstError = 0);
 
 } // namespace KelvraTest
