@@ -108,23 +108,17 @@ TEST(FlagEquality, TrueWhenBothSetOrBothClear)
         }
 }
 
+// An automatic source: see AutoBoolean.EveryReadingOperationConsumesTheSetValue.
 TEST(FlagAssignment, CopiesTheValueNotTheEventAndReturnsTheTarget)
 {
-    const auto check = [](auto& source, auto& target, bool sourceKeepsItsValue)
-    {
-        source = true;
-        EXPECT_EQ(&target, &(target = source));
-        EXPECT_EQ(sourceKeepsItsValue, source.Wait(0))
-            << "a manual source keeps its value, an automatic one not";
-        source = false;
-        EXPECT_TRUE(target.Wait(0)) << "the target was not set, or is tied to the source";
-        target = source;
-        EXPECT_FALSE(target.Wait(0));
-    };
-    CInterlockedBooleanFx2 manualSource, manualTarget;
-    check(manualSource, manualTarget, true);
-    CAutoBoolean autoSource, autoTarget;
-    check(autoSource, autoTarget, false);
+    CInterlockedBooleanFx2 source, target;
+    source = true;
+    EXPECT_EQ(&target, &(target = source));
+    EXPECT_TRUE(source) << "a manual source lost its value";
+    source = false;
+    EXPECT_TRUE(target) << "the target was not set, or is tied to the source";
+    target = source;
+    EXPECT_FALSE(target);
 }
 
 TEST(FlagWait, TimesOutOnAClearFlag)
@@ -150,20 +144,6 @@ TEST(FlagWait, NegativeTimeoutWaitsUntilAnotherThreadSetsTheFlag)
     }
 }
 
-TEST(NamedFlag, ObjectsOfOneNameShareTheValue)
-{
-    const std::wstring name = UniqueObjectName(L"shared");
-    CGlobalBooleanFx2 first(name.c_str());
-    first = true;
-    CGlobalBooleanFx2 second(name.c_str());
-    EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), ::GetLastError());
-    EXPECT_TRUE(second) << "opening an existing name lost its value";
-    second = false;
-    EXPECT_FALSE(first);
-    first = true;
-    EXPECT_FALSE(CGlobalBooleanFx2(UniqueObjectName(L"unrelated").c_str()));
-}
-
 TEST(NamedFlag, UnusableNameGivesAFlagWithoutEvent)
 {
     const std::wstring name = UniqueObjectName(L"taken");
@@ -177,11 +157,15 @@ TEST(NamedFlag, UnusableNameGivesAFlagWithoutEvent)
     EXPECT_LT(Milliseconds([&] { EXPECT_FALSE(flag.Wait(-1)); }), 1000u);
 }
 
-TEST(NamedFlag, IsSharedWithAnotherProcess)
+TEST(NamedFlag, ObjectsOfOneNameShareTheValueAcrossProcesses)
 {
-    const std::wstring name = UniqueObjectName(L"peer");
-    CGlobalBooleanFx2 flag(name.c_str());
-    flag = true;
+    const std::wstring name = UniqueObjectName(L"shared");
+    CGlobalBooleanFx2 first(name.c_str());
+    first = true;
+    CGlobalBooleanFx2 second(name.c_str());
+    EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), ::GetLastError());
+    EXPECT_TRUE(second) << "opening an existing name lost its value";
+    EXPECT_FALSE(CGlobalBooleanFx2(UniqueObjectName(L"unrelated").c_str()));
     // The peer, beside this program, clears the flag once it has found it set.
     wchar_t path[MAX_PATH] = {};
     std::wstring peer(path, ::GetModuleFileNameW(nullptr, path, MAX_PATH));
@@ -189,7 +173,8 @@ TEST(NamedFlag, IsSharedWithAnotherProcess)
     const intptr_t exitCode =
         ::_wspawnl(_P_WAIT, peer.c_str(), (L'"' + peer + L'"').c_str(), name.c_str(), nullptr);
     EXPECT_EQ(0, exitCode) << "-1: the peer did not start, 2: it did not see the value set here";
-    EXPECT_FALSE(flag) << "the peer's clear did not reach this process";
+    EXPECT_FALSE(first) << "the peer's clear did not reach this process";
+    EXPECT_FALSE(second);
 }
 
 } // namespace
