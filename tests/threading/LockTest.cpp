@@ -1,13 +1,15 @@
 #include "KelvraLocks.h"
+#include "ThreadingSupport.h"
 
 #include <gtest/gtest.h>
 
 #include <windows.h>
 
-#include <atomic>
-#include <memory>
+#include <chrono>
+#include <future>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 namespace KelvraCsLocks
@@ -16,16 +18,11 @@ namespace KelvraCsLocks
 // Reaches the private copy operations through the friendship the classes grant it.
 struct CopyRefusalProbe
 {
-    template <typename T>
-    static void CopyConstruct(T& original)
+    // What copy construction from one and assignment of other to one throw.
+    template <typename T> static std::pair<std::string, std::string> Refusals(T& one, T& other)
     {
-        T copy(original);
-    }
-
-    template <typename T>
-    static void Assign(T& target, T& source)
-    {
-        target = source;
+        return {KelvraTest::ThrownLiteral<char>([&] { T copy(one); }),
+                KelvraTest::ThrownLiteral<char>([&] { one = other; })};
     }
 };
 
@@ -44,31 +41,15 @@ using KelvraCsLocks::ICritSec;
 int TryLockElsewhere(CLock& lock)
 {
     int result = 0;
-    std::thread other([&] {
-        result = lock.TryLock();
-        if (result != 0)
-            lock.Unlock();
-    });
+    std::thread other(
+        [&]
+        {
+            result = lock.TryLock();
+            if (result != 0)
+                lock.Unlock();
+        });
     other.join();
     return result;
-}
-
-template <typename Action>
-std::string ThrownText(Action action)
-{
-    try
-    {
-        action();
-    }
-    catch (const char* text)
-    {
-        return text;
-    }
-    catch (...)
-    {
-        return "<an exception of another type>";
-    }
-    return "<nothing thrown>";
 }
 
 TEST(Lock, HoldingIsCountedPerThread)
@@ -76,39 +57,24 @@ TEST(Lock, HoldingIsCountedPerThread)
     CLock lock;
     lock.Lock();
     lock.Lock();
-    EXPECT_EQ(0, TryLockElsewhere(lock));
-    lock.Unlock();
-    EXPECT_EQ(0, TryLockElsewhere(lock)) << "one level is still held";
-    lock.Unlock();
-    EXPECT_NE(0, TryLockElsewhere(lock));
-}
-
-TEST(Lock, TryLockByTheHolderAddsALevel)
-{
-    CLock lock;
-    lock.Lock();
-    EXPECT_NE(0, lock.TryLock());
-    lock.Unlock();
-    EXPECT_EQ(0, TryLockElsewhere(lock));
-    lock.Unlock();
+    ASSERT_NE(0, lock.TryLock()) << "TryLock by the holder adds a level";
+    for (int levels = 3; levels > 0; --levels)
+    {
+        EXPECT_EQ(0, TryLockElsewhere(lock)) << levels << " levels held";
+        lock.Unlock();
+    }
     EXPECT_NE(0, TryLockElsewhere(lock));
 }
 
 TEST(Lock, LockWaitsForTheHolderToRelease)
 {
     CLock lock;
-    std::atomic<bool> entered{false};
     lock.Lock();
-    std::thread other([&] {
-        lock.Lock();
-        entered = true;
-        lock.Unlock();
-    });
-    ::Sleep(150);
-    EXPECT_FALSE(entered) << "the other thread got in while the lock was held";
+    auto other = std::async(std::launch::async, [&] { CScopeLock held(&lock); });
+    EXPECT_EQ(std::future_status::timeout, other.wait_for(std::chrono::milliseconds(150)))
+        << "the other thread got in while the lock was held";
     lock.Unlock();
-    other.join();
-    EXPECT_TRUE(entered);
+    other.get();
 }
 
 TEST(ScopeLock, NestedScopesOnOneLockDoNotBlock)
@@ -118,9 +84,8 @@ TEST(ScopeLock, NestedScopesOnOneLockDoNotBlock)
         CScopeLock outer(&lock);
         {
             CScopeLock inner(&lock);
-            EXPECT_EQ(0, TryLockElsewhere(lock));
         }
-        EXPECT_EQ(0, TryLockElsewhere(lock)) << "the outer scope still holds the lock";
+        EXPECT_EQ(0, TryLockElsewhere(lock)) << "the outer scope no longer holds the lock";
     }
     EXPECT_NE(0, TryLockElsewhere(lock));
 }
@@ -128,98 +93,6 @@ TEST(ScopeLock, NestedScopesOnOneLockDoNotBlock)
 TEST(ScopeLock, NullLockHoldsNothing)
 {
     CScopeLock nothing(nullptr);
-}
-
-TEST(Lock, CopiesAreRefusedWithTheClassLiteral)
-{
-    std::unique_ptr<ICritSec> section(new CCritSec());
-    CCritSec& critSec = static_cast<CCritSec&>(*section);
-    CLock lock;
-    CLock otherLock;
-    CScopeLock scope(&lock);
-    CScopeLock otherScope(&otherLock);
-
-    EXPECT_EQ("Not copyable", ThrownText([&] { CopyRefusalProbe::CopyConstruct(critSec); }));
-    EXPECT_EQ("Not copyable", ThrownText([&] { CopyRefusalProbe::Assign(critSec, critSec); }));
-    EXPECT_EQ("Not implemented", ThrownText([&] { CopyRefusalProbe::CopyConstruct(lock); }));
-    EXPECT_EQ("Not implemented", ThrownText([&] { CopyRefusalProbe::Assign(lock, otherLock); }));
-    EXPECT_EQ("Not implemented", ThrownText([&] { CopyRefusalProbe::CopyConstruct(scope); }));
-    EXPECT_EQ("Not implemented", ThrownText([&] { CopyRefusalProbe::Assign(scope, otherScope); }));
-    // The refused scope copy must not have released the lock the original holds.
-    EXPECT_EQ(0, TryLockElsewhere(lock));
-}
-
-// Records every call a lock makes on its section, and the section's destruction.
-class CountingSection : public ICritSec
-{
-public:
-    CountingSection(const char* name, std::vector<std::string>& calls) : m_name(name), m_calls(calls) {}
-    ~CountingSection() override { Record("destroyed"); }
-
-    void InitCritSec() override { Record("init"); }
-    void EnterCritSec() override { Record("enter"); }
-    int TryEnterCritSec() override
-    {
-        Record("try");
-        return 7;
-    }
-    void LeaveCritSec() override { Record("leave"); }
-    void DeleteCritSec() override { Record("delete"); }
-
-private:
-    void Record(const char* call) { m_calls.push_back(m_name + "." + call); }
-
-    std::string m_name;
-    std::vector<std::string>& m_calls;
-};
-
-class AdoptingLock : public CLock
-{
-public:
-    explicit AdoptingLock(ICritSec* section) : CLock(section) {}
-    using CLock::Init;
-};
-
-using Calls = std::vector<std::string>;
-
-TEST(Lock, DrivesItsSectionAndDestroysItExactlyOnce)
-{
-    Calls calls;
-    {
-        AdoptingLock lock(new CountingSection("a", calls));
-        EXPECT_EQ(Calls({"a.init"}), calls);
-        lock.Lock();
-        EXPECT_EQ(7, lock.TryLock());
-        lock.Unlock();
-        calls.clear();
-    }
-    EXPECT_EQ(Calls({"a.delete", "a.destroyed"}), calls);
-}
-
-TEST(Lock, InitFinalisesAndDeletesTheSectionItReplaces)
-{
-    Calls calls;
-    {
-        AdoptingLock lock(new CountingSection("a", calls));
-        ICritSec* replacement = new CountingSection("b", calls);
-        lock.Init(replacement);
-        lock.Init(replacement);
-        lock.Init(nullptr);
-        lock.Lock();
-        EXPECT_EQ(Calls({"a.init", "a.delete", "a.destroyed", "b.init", "b.enter"}), calls);
-        lock.Unlock();
-        calls.clear();
-    }
-    EXPECT_EQ(Calls({"b.delete", "b.destroyed"}), calls);
-}
-
-TEST(Lock, NullSectionGivesAWorkingLock)
-{
-    AdoptingLock lock(nullptr);
-    lock.Lock();
-    EXPECT_EQ(0, TryLockElsewhere(lock));
-    lock.Unlock();
-    EXPECT_NE(0, TryLockElsewhere(lock));
 }
 
 // A critical section whose record comes from its creator, as a host's derived class would do it.
@@ -230,9 +103,76 @@ public:
     using CCritSec::Init;
 };
 
-CRITICAL_SECTION* NewRecord()
+TEST(Lock, CopiesAreRefusedWithTheClassLiteral)
 {
-    return static_cast<CRITICAL_SECTION*>(::HeapAlloc(::GetProcessHeap(), 0, sizeof(CRITICAL_SECTION)));
+    using Texts = std::pair<std::string, std::string>;
+    HostRecordSection section(nullptr);
+    CLock lock, otherLock;
+    CScopeLock scope(&lock), otherScope(&otherLock);
+    EXPECT_EQ(Texts("Not copyable", "Not copyable"), CopyRefusalProbe::Refusals<CCritSec>(section, section));
+    EXPECT_EQ(Texts("Not implemented", "Not implemented"), CopyRefusalProbe::Refusals(lock, otherLock));
+    EXPECT_EQ(Texts("Not implemented", "Not implemented"), CopyRefusalProbe::Refusals(scope, otherScope));
+    // The refused scope copy must not have released the lock the original holds.
+    EXPECT_EQ(0, TryLockElsewhere(lock));
+}
+
+using Calls = std::vector<std::string>;
+
+// Records every call a lock makes on its section, and the section's destruction. TryEnterCritSec
+// answers 7, for TryLock to pass on.
+class CountingSection : public ICritSec
+{
+public:
+    CountingSection(const char* name, Calls& calls) : m_name(name), m_calls(calls) {}
+    ~CountingSection() override { Record("destroyed"); }
+    void InitCritSec() override { Record("init"); }
+    void EnterCritSec() override { Record("enter"); }
+    int TryEnterCritSec() override { return Record("try"); }
+    void LeaveCritSec() override { Record("leave"); }
+    void DeleteCritSec() override { Record("delete"); }
+
+private:
+    int Record(const char* call)
+    {
+        m_calls.push_back(m_name + "." + call);
+        return 7;
+    }
+
+    std::string m_name;
+    Calls& m_calls;
+};
+
+class AdoptingLock : public CLock
+{
+public:
+    explicit AdoptingLock(ICritSec* section) : CLock(section) {}
+    using CLock::Init;
+};
+
+TEST(Lock, DeletesEachSectionItOwnsExactlyOnceAlsoWhenInitReplacesIt)
+{
+    Calls calls;
+    {
+        AdoptingLock lock(new CountingSection("a", calls));
+        lock.Lock();
+        EXPECT_EQ(7, lock.TryLock());
+        lock.Unlock();
+        ICritSec* replacement = new CountingSection("b", calls);
+        lock.Init(replacement);
+        lock.Init(replacement);
+        lock.Init(nullptr);
+    }
+    EXPECT_EQ(Calls({"a.init", "a.enter", "a.try", "a.leave", "a.delete", "a.destroyed", "b.init", "b.delete",
+                     "b.destroyed"}),
+              calls);
+}
+
+TEST(Lock, NullSectionGivesAWorkingLock)
+{
+    AdoptingLock lock(nullptr);
+    lock.Lock();
+    EXPECT_EQ(0, TryLockElsewhere(lock));
+    lock.Unlock();
 }
 
 bool IsAllocated(const void* block)
@@ -247,37 +187,27 @@ bool IsAllocated(const void* block)
     return found;
 }
 
-TEST(CritSec, AdoptedRecordIsUsedAndFreedWithTheSection)
-{
-    CRITICAL_SECTION* record = NewRecord();
-    ASSERT_TRUE(IsAllocated(record));
-    {
-        AdoptingLock lock(new HostRecordSection(record));
-        lock.Lock();
-        EXPECT_EQ(1, record->RecursionCount) << "the lock does not run on the adopted record";
-        EXPECT_EQ(0, TryLockElsewhere(lock));
-        lock.Unlock();
-    }
-    EXPECT_FALSE(IsAllocated(record));
-}
-
+// Also covers the record adopted at construction: it is the one Init must free.
 TEST(CritSec, InitFreesTheRecordItReplaces)
 {
-    CRITICAL_SECTION* first = NewRecord();
-    CRITICAL_SECTION* second = NewRecord();
+    const auto newRecord = []
+    { return static_cast<CRITICAL_SECTION*>(::HeapAlloc(::GetProcessHeap(), 0, sizeof(CRITICAL_SECTION))); };
+    CRITICAL_SECTION* first = newRecord();
+    CRITICAL_SECTION* second = newRecord();
+    ASSERT_TRUE(IsAllocated(first));
     HostRecordSection* section = new HostRecordSection(first);
     section->Init(second);
-    EXPECT_FALSE(IsAllocated(first));
+    EXPECT_FALSE(IsAllocated(first)) << "the replaced record leaked";
     section->Init(nullptr);
     section->Init(second);
-    EXPECT_TRUE(IsAllocated(second));
+    EXPECT_TRUE(IsAllocated(second)) << "Init with the record already held freed it";
     {
         AdoptingLock lock(section);
         lock.Lock();
-        EXPECT_EQ(1, second->RecursionCount);
+        EXPECT_EQ(1, second->RecursionCount) << "the lock does not run on the adopted record";
         lock.Unlock();
     }
-    EXPECT_FALSE(IsAllocated(second));
+    EXPECT_FALSE(IsAllocated(second)) << "the record was not freed with the section";
 }
 
 } // namespace

@@ -6,31 +6,42 @@
 
 #include <windows.h>
 
-#include <atomic>
 #include <memory>
 
 namespace
 {
 
+using KelvraCsThread::CAutoBoolean;
 using KelvraCsThread::CInterlockedBooleanFx2;
 using KelvraCsThread::CThreadWin32;
-using KelvraTest::OpenHandleCount;
-using KelvraTest::Stopwatch;
+using KelvraTest::Milliseconds;
+using KelvraTest::ThrownLiteral;
 
-constexpr DWORD kSelfStopped = 0xA5A5A5A5u;
 constexpr DWORD kTerminated = 0xFFFFFFFDu;
 // Long enough never to be reached on a busy machine; the tests check they were not.
 constexpr int kPatientTimeout = 20000;
+
+// Handles open in this process, counted by probing every plausible handle value (Wine 8 answers 0 to
+// GetProcessHandleCount): values are multiples of 4 handed out from the lowest free slot, and a test
+// process holds a few dozen.
+unsigned long OpenHandleCount()
+{
+    unsigned long open = 0;
+    for (ULONG_PTR value = 4; value <= 4 * 4096; value += 4)
+    {
+        DWORD flags = 0;
+        open += ::GetHandleInformation(reinterpret_cast<HANDLE>(value), &flags) ? 1 : 0;
+    }
+    return open;
+}
 
 // What a test worker reports. It outlives the worker, so that a body may go on running while
 // the worker is destroyed.
 struct WorkerProbe
 {
-    CInterlockedBooleanFx2 started; // set once self holds a handle to the worker thread
-    CInterlockedBooleanFx2 release; // lets WaitForRelease return
+    CAutoBoolean started;           // set once self holds a handle to the worker thread
+    CInterlockedBooleanFx2 release; // lets Cooperate return
     Kelvra::UniqueThread self;
-    std::atomic<int> runs{0};
-    std::atomic<bool> wasItMe{false};
 
     // The worker thread's exit code, or STILL_ACTIVE when it has not ended within timeout.
     DWORD ExitCode(DWORD timeout = 5000) const
@@ -42,58 +53,47 @@ struct WorkerProbe
     }
 };
 
+// A worker thread running body, which each test may choose before Create.
 class Worker : public CThreadWin32
 {
 public:
     using Body = unsigned int (*)(Worker& worker, WorkerProbe& probe);
 
-    Worker(WorkerProbe& probe, Body body) : m_probe(probe), m_body(body) {}
+    Worker(WorkerProbe& probe, Body body) : body(body), m_probe(probe) {}
 
     using CThreadWin32::IsItMe;
 
     // Starts the thread and waits until its body runs.
     void StartAndWait()
     {
-        m_probe.started = false;
         Create();
         ASSERT_TRUE(m_probe.started.Wait(5000)) << "the body never ran";
     }
+
+    Body body;
 
 protected:
     unsigned int Run() override
     {
         // Only locals from here on: the bodies that ignore a stop request outlive this object.
         WorkerProbe& probe = m_probe;
-        const Body body = m_body;
+        const Body run = body;
         const HANDLE process = ::GetCurrentProcess();
-        ::DuplicateHandle(process, ::GetCurrentThread(), process, probe.self.put(), 0, FALSE, DUPLICATE_SAME_ACCESS);
-        ++probe.runs;
+        ::DuplicateHandle(process, ::GetCurrentThread(), process, probe.self.put(), 0, FALSE,
+                          DUPLICATE_SAME_ACCESS);
         probe.started = true;
-        return body(*this, probe);
+        return run(*this, probe);
     }
 
 private:
     WorkerProbe& m_probe;
-    Body m_body;
 };
 
-unsigned int WaitForRelease(Worker&, WorkerProbe& probe)
+// Ends with 7 once released, with 43 once a stop is requested.
+unsigned int Cooperate(Worker& worker, WorkerProbe& probe)
 {
-    probe.release.Wait(-1);
-    return 7;
-}
-
-unsigned int PollStopRequest(Worker& worker, WorkerProbe&)
-{
-    while (!worker.StopRequested())
-        ::Sleep(1);
-    return 42;
-}
-
-unsigned int WaitForStopEvent(Worker& worker, WorkerProbe&)
-{
-    ::WaitForSingleObject(worker.GetStopRequestEvent(), INFINITE);
-    return 43;
+    const HANDLE events[] = {probe.release.GetEvent(), worker.GetStopRequestEvent()};
+    return ::WaitForMultipleObjects(2, events, FALSE, INFINITE) == WAIT_OBJECT_0 ? 7 : 43;
 }
 
 [[noreturn]] unsigned int IgnoreStopRequest(Worker&, WorkerProbe&)
@@ -102,229 +102,137 @@ unsigned int WaitForStopEvent(Worker& worker, WorkerProbe&)
         ::Sleep(10);
 }
 
-unsigned int StopItself(Worker& worker, WorkerProbe&)
+// A cooperating worker, unless the test gives it another body.
+class ThreadWin32 : public testing::Test
 {
-    worker.Stop(kPatientTimeout);
-    return 1;
-}
-
-unsigned int SuspendItself(Worker&, WorkerProbe&)
-{
-    ::SuspendThread(::GetCurrentThread());
-    return 5;
-}
-
-unsigned int RecordIsItMe(Worker& worker, WorkerProbe& probe)
-{
-    probe.wasItMe = worker.IsItMe();
-    return 0;
-}
-
-TEST(ThreadWin32, IsRunningFromCreateUntilRunReturns)
-{
+protected:
     WorkerProbe probe;
-    Worker worker(probe, &WaitForRelease);
+    Worker worker{probe, &Cooperate};
+};
+
+TEST_F(ThreadWin32, CreateStartsOneBodyAndIsRunningUntilItReturns)
+{
     EXPECT_FALSE(worker.IsRunning());
     worker.Create();
     EXPECT_TRUE(worker.IsRunning());
     ASSERT_TRUE(probe.started.Wait(5000));
+    worker.Create();
     probe.release = true;
     EXPECT_TRUE(worker.WaitForExit(5000));
-    EXPECT_FALSE(worker.IsRunning());
+    EXPECT_FALSE(probe.started.Wait(0)) << "Create while running started another body";
     EXPECT_EQ(7u, probe.ExitCode());
+    EXPECT_FALSE(worker.IsRunning());
 }
 
-TEST(ThreadWin32, CreateWhileRunningDoesNothing)
+TEST_F(ThreadWin32, WithoutAThreadCallsChangeNothing)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &WaitForRelease);
-    worker.StartAndWait();
-    worker.Create();
-    worker.Create();
-    probe.release = true;
-    EXPECT_TRUE(worker.WaitForExit(5000));
-    EXPECT_EQ(1, probe.runs);
+    worker.Stop(kPatientTimeout);
+    EXPECT_FALSE(worker.StopRequested());
+    EXPECT_TRUE(worker.WaitForExit(0));
+    EXPECT_EQ(0xFFFFFFFFu, worker.Resume());
+    EXPECT_EQ(THREAD_PRIORITY_ERROR_RETURN, worker.GetPriority());
 }
 
-TEST(ThreadWin32, CreateAfterRunReturnedStartsANewThread)
+TEST_F(ThreadWin32, WaitForExitTimesOutOnlyWhileTheBodyRuns)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &WaitForRelease);
-    probe.release = true;
-    worker.StartAndWait();
-    EXPECT_TRUE(worker.WaitForExit(5000));
-    worker.StartAndWait();
-    EXPECT_TRUE(worker.WaitForExit(5000));
-    EXPECT_EQ(2, probe.runs);
-}
-
-TEST(ThreadWin32, WaitForExitTimesOutOnlyWhileTheBodyRuns)
-{
-    WorkerProbe probe;
-    Worker worker(probe, &WaitForRelease);
-    EXPECT_TRUE(worker.WaitForExit(0)) << "never started";
     worker.StartAndWait();
     EXPECT_FALSE(worker.WaitForExit(0));
-    const Stopwatch watch;
-    EXPECT_FALSE(worker.WaitForExit(200));
-    EXPECT_GE(watch.Milliseconds(), 150);
+    EXPECT_GE(Milliseconds([&] { EXPECT_FALSE(worker.WaitForExit(200)); }), 150u);
     probe.release = true;
     EXPECT_TRUE(worker.WaitForExit(INFINITE));
 }
 
-struct CooperativeBody
+TEST_F(ThreadWin32, StopEndsACooperativeBodyWithItsResult)
 {
-    const char* name;
-    Worker::Body body;
-    DWORD exitCode;
-};
-
-class ThreadWin32Stop : public testing::TestWithParam<CooperativeBody>
-{
-};
-
-TEST_P(ThreadWin32Stop, EndsACooperativeBodyWithItsResult)
-{
-    WorkerProbe probe;
-    Worker worker(probe, GetParam().body);
     worker.StartAndWait();
-    const Stopwatch watch;
-    worker.Stop(kPatientTimeout);
-    EXPECT_LT(watch.Milliseconds(), 5000) << "Stop waited for its time-out";
-    EXPECT_EQ(GetParam().exitCode, probe.ExitCode(0)) << "the thread has not ended with its result";
+    EXPECT_LT(Milliseconds([&] { worker.Stop(kPatientTimeout); }), 5000u) << "Stop waited for its time-out";
+    EXPECT_EQ(43u, probe.ExitCode(0)) << "the thread has not ended with its result";
     EXPECT_FALSE(worker.IsRunning());
-    EXPECT_TRUE(worker.StopRequested());
 }
 
-INSTANTIATE_TEST_SUITE_P(Bodies, ThreadWin32Stop,
-                         testing::Values(CooperativeBody{"PollingStopRequested", &PollStopRequest, 42},
-                                         CooperativeBody{"WaitingOnTheStopEvent", &WaitForStopEvent, 43}),
-                         [](const testing::TestParamInfo<CooperativeBody>& info) {
-                             return std::string(info.param.name);
-                         });
-
-TEST(ThreadWin32, StopTerminatesABodyThatIgnoresTheRequest)
+TEST_F(ThreadWin32, StopTerminatesABodyThatIgnoresTheRequest)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &IgnoreStopRequest);
+    worker.body = &IgnoreStopRequest;
     worker.StartAndWait();
-    const Stopwatch watch;
-    worker.Stop(100);
-    const long long elapsed = watch.Milliseconds();
-    EXPECT_GE(elapsed, 80);
-    EXPECT_LT(elapsed, 3000);
+    const ULONGLONG elapsed = Milliseconds([&] { worker.Stop(100); });
+    EXPECT_GE(elapsed, 80u);
+    EXPECT_LT(elapsed, 3000u);
     EXPECT_EQ(kTerminated, probe.ExitCode(0)) << "the thread has not ended when Stop returned";
     EXPECT_FALSE(worker.IsRunning());
 }
 
-TEST(ThreadWin32, StopFromInsideRunEndsTheWorker)
+TEST_F(ThreadWin32, StopFromInsideRunEndsTheWorker)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &StopItself);
+    worker.body = [](Worker& self, WorkerProbe&) -> unsigned int
+    {
+        self.Stop(kPatientTimeout);
+        return 1;
+    };
     worker.StartAndWait();
-    EXPECT_EQ(kSelfStopped, probe.ExitCode());
+    EXPECT_EQ(0xA5A5A5A5u, probe.ExitCode());
     EXPECT_FALSE(worker.IsRunning());
     EXPECT_TRUE(worker.StopRequested());
-    EXPECT_TRUE(worker.WaitForExit(0));
 }
 
-TEST(ThreadWin32, StopAfterRunReturnedKeepsTheExitCode)
+TEST_F(ThreadWin32, IsItMeOnlyOnTheWorkerFromItsFirstInstruction)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &WaitForRelease);
+    worker.body = [](Worker& self, WorkerProbe&) -> unsigned int { return self.IsItMe() ? 1 : 0; };
+    worker.StartAndWait();
+    EXPECT_EQ(1u, probe.ExitCode()) << "the worker did not know itself";
+    EXPECT_FALSE(worker.IsItMe());
+}
+
+TEST_F(ThreadWin32, StopAfterRunReturnedKeepsTheExitCode)
+{
     probe.release = true;
     worker.StartAndWait();
     ASSERT_TRUE(worker.WaitForExit(5000));
-    const Stopwatch watch;
-    worker.Stop(kPatientTimeout);
-    EXPECT_LT(watch.Milliseconds(), 5000);
-    EXPECT_EQ(7u, probe.ExitCode());
+    EXPECT_LT(Milliseconds([&] { worker.Stop(kPatientTimeout); }), 5000u);
+    EXPECT_EQ(7u, probe.ExitCode(0)) << "Stop returned before the thread ended, or terminated it";
 }
 
-TEST(ThreadWin32, StopWithoutAThreadDoesNothing)
+TEST_F(ThreadWin32, StopRequestStaysSetUntilClearedThroughItsEvent)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &WaitForRelease);
-    worker.Stop(kPatientTimeout);
-    EXPECT_FALSE(worker.StopRequested());
-    EXPECT_FALSE(worker.IsRunning());
-}
-
-TEST(ThreadWin32, StopRequestStaysSetUntilClearedThroughItsEvent)
-{
-    WorkerProbe probe;
-    Worker worker(probe, &PollStopRequest);
     worker.StartAndWait();
     worker.Stop(kPatientTimeout);
-
     worker.StartAndWait();
     EXPECT_TRUE(worker.WaitForExit(5000)) << "a restarted body saw no stop request";
-    EXPECT_EQ(42u, probe.ExitCode());
-
     ::ResetEvent(worker.GetStopRequestEvent());
     EXPECT_FALSE(worker.StopRequested());
     worker.StartAndWait();
-    EXPECT_FALSE(worker.WaitForExit(200));
-    worker.Stop(kPatientTimeout);
-    EXPECT_EQ(42u, probe.ExitCode());
+    EXPECT_FALSE(worker.WaitForExit(200)) << "the cleared request still ended the body";
 }
 
-TEST(ThreadWin32, KillTerminatesAndLeavesTheStateToStop)
+TEST_F(ThreadWin32, KillTerminatesAndLeavesTheStateToStop)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &IgnoreStopRequest);
+    worker.body = &IgnoreStopRequest;
     worker.StartAndWait();
     worker.Kill();
     EXPECT_EQ(kTerminated, probe.ExitCode());
     EXPECT_TRUE(worker.IsRunning());
     EXPECT_FALSE(worker.StopRequested());
-    EXPECT_TRUE(worker.WaitForExit(5000));
-    const Stopwatch watch;
-    worker.Stop(kPatientTimeout);
-    EXPECT_LT(watch.Milliseconds(), 5000);
+    EXPECT_LT(Milliseconds([&] { worker.Stop(kPatientTimeout); }), 5000u);
     EXPECT_FALSE(worker.IsRunning());
 }
 
-TEST(ThreadWin32, IsItMeOnlyOnTheWorkerFromItsFirstInstruction)
+TEST_F(ThreadWin32, ResumeGivesThePreviousSuspendCount)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &RecordIsItMe);
-    worker.StartAndWait();
-    ASSERT_TRUE(worker.WaitForExit(5000));
-    EXPECT_TRUE(probe.wasItMe);
-    EXPECT_FALSE(worker.IsItMe());
-}
-
-bool WaitUntilSuspended(HANDLE thread)
-{
-    for (int attempt = 0; attempt < 500; ++attempt)
+    worker.body = [](Worker&, WorkerProbe&) -> unsigned int
     {
-        const DWORD count = ::SuspendThread(thread);
-        ::ResumeThread(thread);
-        if (count != static_cast<DWORD>(-1) && count > 0)
-            return true;
-        ::Sleep(10);
-    }
-    return false;
-}
-
-TEST(ThreadWin32, ResumeGivesThePreviousSuspendCount)
-{
-    WorkerProbe probe;
-    Worker worker(probe, &SuspendItself);
-    EXPECT_EQ(0xFFFFFFFFu, worker.Resume()) << "no thread";
+        ::SuspendThread(::GetCurrentThread());
+        return 5;
+    };
     worker.StartAndWait();
-    ASSERT_TRUE(WaitUntilSuspended(probe.self.get()));
-    EXPECT_EQ(1u, worker.Resume());
+    // Until the body has suspended itself, Resume finds a count of 0 and changes nothing.
+    unsigned long previous = 0;
+    for (int attempt = 0; attempt < 500 && previous == 0; ++attempt, ::Sleep(10))
+        previous = worker.Resume();
+    EXPECT_EQ(1u, previous);
     EXPECT_EQ(5u, probe.ExitCode());
 }
 
-TEST(ThreadWin32, PriorityIsSetAndReadOnTheThread)
+TEST_F(ThreadWin32, PriorityIsSetAndReadOnTheThread)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &WaitForRelease);
-    EXPECT_EQ(THREAD_PRIORITY_ERROR_RETURN, worker.GetPriority()) << "no thread";
-    worker.SetPriority(THREAD_PRIORITY_HIGHEST);
     worker.StartAndWait();
     for (int priority : {THREAD_PRIORITY_LOWEST, THREAD_PRIORITY_BELOW_NORMAL, THREAD_PRIORITY_NORMAL,
                          THREAD_PRIORITY_ABOVE_NORMAL, THREAD_PRIORITY_HIGHEST})
@@ -333,72 +241,41 @@ TEST(ThreadWin32, PriorityIsSetAndReadOnTheThread)
         EXPECT_EQ(priority, worker.GetPriority());
         EXPECT_EQ(priority, ::GetThreadPriority(probe.self.get()));
     }
-    probe.release = true;
 }
 
-TEST(ThreadWin32, SuspendIsRefused)
+TEST_F(ThreadWin32, SuspendAndCopyAreRefusedWithTheirLiterals)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &WaitForRelease);
-    try
-    {
-        worker.Suspend();
-        ADD_FAILURE() << "no exception";
-    }
-    catch (const wchar_t* text)
-    {
-        EXPECT_STREQ(L"Thread suspend operation is not safe", text);
-    }
+    EXPECT_EQ(L"Thread suspend operation is not safe", ThrownLiteral<wchar_t>([&] { worker.Suspend(); }));
+    EXPECT_EQ(KelvraTest::kFlagCopyRefusal, ThrownLiteral<wchar_t>([&] { Worker copy(worker); }));
 }
 
-TEST(ThreadWin32, CopyConstructionIsRefusedWithTheFlagLiteral)
+TEST_F(ThreadWin32, DestroyingAWorkerThatIgnoresTheRequestTakesAboutFiveSeconds)
 {
-    WorkerProbe probe;
-    Worker original(probe, &WaitForRelease);
-    try
-    {
-        Worker copy(original);
-        ADD_FAILURE() << "no exception";
-    }
-    catch (const wchar_t* text)
-    {
-        EXPECT_STREQ(L"You can't use CGlobalBooleanFx2::CGlobalBooleanFx2 copy constructor", text);
-    }
-}
-
-TEST(ThreadWin32, DestroyingAWorkerThatIgnoresTheRequestTakesAboutFiveSeconds)
-{
-    WorkerProbe probe;
-    auto worker = std::make_unique<Worker>(probe, &IgnoreStopRequest);
-    worker->StartAndWait();
-    const Stopwatch watch;
-    worker.reset();
-    const long long elapsed = watch.Milliseconds();
-    EXPECT_GE(elapsed, 4500);
-    EXPECT_LT(elapsed, 15000);
+    auto unresponsive = std::make_unique<Worker>(probe, &IgnoreStopRequest);
+    unresponsive->StartAndWait();
+    const ULONGLONG elapsed = Milliseconds([&] { unresponsive.reset(); });
+    EXPECT_GE(elapsed, 4500u);
+    EXPECT_LT(elapsed, 15000u);
     EXPECT_EQ(kTerminated, probe.ExitCode(0));
 }
 
-TEST(ThreadWin32, AssignmentTakesAHandleOfItsOwn)
+TEST_F(ThreadWin32, AssignmentTakesAHandleOfItsOwn)
 {
-    WorkerProbe probe;
-    WorkerProbe unused;
     const unsigned long handlesBefore = OpenHandleCount();
     {
-        Worker original(probe, &WaitForStopEvent);
-        Worker copy(unused, &WaitForRelease);
-        original.StartAndWait();
-        original.SetPriority(THREAD_PRIORITY_BELOW_NORMAL);
-        static_cast<CThreadWin32&>(copy) = original;
+        Worker copy(probe, &Cooperate);
+        worker.StartAndWait();
+        worker.SetPriority(THREAD_PRIORITY_BELOW_NORMAL);
+        static_cast<CThreadWin32&>(copy) = worker;
         EXPECT_TRUE(copy.IsRunning());
         EXPECT_FALSE(copy.StopRequested());
 
-        original.Stop(kPatientTimeout);
+        worker.Stop(kPatientTimeout);
         EXPECT_EQ(43u, probe.ExitCode(0));
-        EXPECT_EQ(THREAD_PRIORITY_BELOW_NORMAL, copy.GetPriority()) << "the copy lost its handle with the original's";
-        EXPECT_TRUE(copy.WaitForExit(0));
+        EXPECT_EQ(THREAD_PRIORITY_BELOW_NORMAL, copy.GetPriority())
+            << "the copy lost its handle with the original's";
 
-        static_cast<CThreadWin32&>(copy) = original;
+        static_cast<CThreadWin32&>(copy) = worker;
         EXPECT_TRUE(copy.StopRequested());
         EXPECT_FALSE(copy.IsRunning());
         EXPECT_EQ(THREAD_PRIORITY_ERROR_RETURN, copy.GetPriority()) << "the original has no thread any more";
@@ -407,17 +284,14 @@ TEST(ThreadWin32, AssignmentTakesAHandleOfItsOwn)
     EXPECT_EQ(handlesBefore, OpenHandleCount());
 }
 
-TEST(ThreadWin32, ManyCyclesLeaveNoHandleOpen)
+// Also shows that Create starts a new thread once Run has returned.
+TEST_F(ThreadWin32, ManyCyclesLeaveNoHandleOpen)
 {
-    WorkerProbe probe;
-    Worker worker(probe, &WaitForStopEvent);
-    Worker finisher(probe, &WaitForRelease);
     // One cycle first, so that whatever the runtime sets up once per process is not counted.
     worker.StartAndWait();
     worker.Stop(kPatientTimeout);
     probe.self.reset();
     const unsigned long handlesBefore = OpenHandleCount();
-
     for (int cycle = 0; cycle < 50; ++cycle)
     {
         ::ResetEvent(worker.GetStopRequestEvent());
@@ -425,14 +299,14 @@ TEST(ThreadWin32, ManyCyclesLeaveNoHandleOpen)
         worker.Stop(kPatientTimeout);
         ASSERT_EQ(43u, probe.ExitCode(0)) << "cycle " << cycle;
     }
-    // Threads that end on their own: each Create closes the handle of the previous one.
+    // Threads that end on their own, each started anew by Create, which closes the previous handle.
     probe.release = true;
     for (int cycle = 0; cycle < 20; ++cycle)
     {
-        finisher.StartAndWait();
-        ASSERT_TRUE(finisher.WaitForExit(5000)) << "cycle " << cycle;
+        worker.StartAndWait();
+        ASSERT_TRUE(worker.WaitForExit(5000)) << "cycle " << cycle;
     }
-    finisher.Stop(kPatientTimeout);
+    worker.Stop(kPatientTimeout);
     probe.self.reset();
     EXPECT_EQ(handlesBefore, OpenHandleCount());
 }

@@ -1,30 +1,40 @@
-// Helpers the threading tests share: elapsed time, open handles, unique kernel-object names.
+// Helpers the threading tests share.
 #pragma once
 
-#include <chrono>
+#include <windows.h>
+
 #include <string>
 
 namespace KelvraTest
 {
 
-class Stopwatch
+// What the copy constructors of the flags and of the worker thread throw.
+constexpr const wchar_t* kFlagCopyRefusal =
+    L"You can't use CGlobalBooleanFx2::CGlobalBooleanFx2 copy constructor";
+
+// The string literal (a const Char*) that action throws; empty when it throws nothing or something else.
+template <typename Char, typename Action> std::basic_string<Char> ThrownLiteral(Action action)
 {
-public:
-    long long Milliseconds() const
+    try
     {
-        return std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - m_start).count();
+        action();
     }
+    catch (const Char* text)
+    {
+        return text;
+    }
+    catch (...)
+    {
+    }
+    return {};
+}
 
-private:
-    using Clock = std::chrono::steady_clock;
-    Clock::time_point m_start = Clock::now();
-};
-
-// Handles open in this process. GetProcessHandleCount where it counts; Wine 8 answers 0, so
-// there every plausible handle value is probed instead.
-unsigned long OpenHandleCount();
-
-// A name no other test run on this machine uses: "Kelvra.Threading.<pid>.<purpose>".
-std::wstring UniqueObjectName(const wchar_t* purpose);
+// How long action took, in milliseconds.
+template <typename Action> ULONGLONG Milliseconds(Action action)
+{
+    const ULONGLONG start = ::GetTickCount64();
+    action();
+    return ::GetTickCount64() - start;
+}
 
 } // namespace KelvraTest
