@@ -2,11 +2,11 @@
 // public macros. Built with a host's default compiler settings, like any user's DLL.
 #include <Kelvra.h>
 
-extern "C" __declspec(dllexport) void SampleTrace(int level, const wchar_t* text)
+extern "C" __declspec(dllexport) void SampleTrace(char level, const wchar_t* text)
 {
-    if (level == 0)
+    if (level == 't')
         KELVRA_TRC(L"sample %s", text);
-    else if (level == 1)
+    else if (level == 'i')
         KELVRA_INF(L"sample %s", text);
     else
         KELVRA_ERR(L"sample %s", text);

@@ -1,6 +1,7 @@
 // TraceChild.exe: a host program the trace tests start in a fresh process (the trace state is
-// process-wide). Built with a host's default compiler settings. Each argument is one step, run
-// in order; steps that have a result print one line "<step>:<result>" on standard output.
+// process-wide), built with a host's default compiler settings. Each argument is one step, run
+// in order; steps that have a result report one line "<step>:<result>" on standard output.
+//   out:<file>                                   standard output goes to this file (the first step)
 //   start:<name>:<append 0|1>:<perProcess 0|1>   Debug::start, prints "ok" or the exception text
 //   stop | configure                             Debug::stop / Debug::configure
 //   trc:<text> | inf:<text> | err:<text>         a line of this module: "host <text>"
@@ -19,18 +20,14 @@
 
 #include <cerrno>
 #include <cstdio>
+#include <cstring>
 #include <stdexcept>
 #include <string>
 
-extern "C" __declspec(dllimport) void SampleTrace(int level, const wchar_t* text);
+extern "C" __declspec(dllimport) void SampleTrace(char level, const wchar_t* text);
 
 namespace
 {
-
-std::wstring Widen(const std::string& text)
-{
-    return std::wstring(text.begin(), text.end());
-}
 
 void Report(const std::string& step, const std::string& result)
 {
@@ -38,26 +35,14 @@ void Report(const std::string& step, const std::string& result)
     std::fflush(stdout);
 }
 
-void HostLine(char level, const std::wstring& text)
-{
-    if (level == 't')
-        KELVRA_TRC(L"host %s", text.c_str());
-    else if (level == 'i')
-        KELVRA_INF(L"host %s", text.c_str());
-    else
-        KELVRA_ERR(L"host %s", text.c_str());
-}
-
 void Start(const std::string& arguments)
 {
-    // <name>:<append>:<perProcess>
-    const size_t second = arguments.rfind(':', arguments.size() - 3);
-    const std::wstring name = Widen(arguments.substr(0, second));
-    const bool append = arguments[second + 1] == '1';
-    const bool perProcess = arguments[second + 3] == '1';
+    char name[64] = "";
+    int append = 0, perProcess = 0;
+    std::sscanf(arguments.c_str(), "%63[^:]:%d:%d", name, &append, &perProcess);
     try
     {
-        Debug::start(name, append, perProcess);
+        Debug::start(std::wstring(name, name + std::strlen(name)), append != 0, perProcess != 0);
         Report("start", "ok");
     }
     catch (const std::exception& error)
@@ -66,33 +51,30 @@ void Start(const std::string& arguments)
     }
 }
 
-HANDLE OpenNamedEvent(const std::string& name)
-{
-    return ::OpenEventW(EVENT_MODIFY_STATE | SYNCHRONIZE, FALSE, Widen(name).c_str());
-}
-
 bool RunStep(const std::string& step)
 {
     const size_t colon = step.find(':');
     const std::string verb = step.substr(0, colon);
     const std::string argument = colon == std::string::npos ? std::string() : step.substr(colon + 1);
-    const std::wstring text = Widen(argument);
-    if (verb == "start")
+    const std::wstring text(argument.begin(), argument.end());
+    if (verb == "out")
+        return ::_wfreopen(text.c_str(), L"w", stdout) != nullptr;
+    else if (verb == "start")
         Start(argument);
     else if (verb == "stop")
         Debug::stop();
     else if (verb == "configure")
         Debug::configure();
-    else if (verb == "trc" || verb == "inf" || verb == "err")
-        HostLine(verb[0], text);
-    else if (verb == "sample-trc")
-        SampleTrace(0, text.c_str());
-    else if (verb == "sample-inf")
-        SampleTrace(1, text.c_str());
-    else if (verb == "sample-err")
-        SampleTrace(3, text.c_str());
+    else if (verb == "trc")
+        KELVRA_TRC(L"host %s", text.c_str());
+    else if (verb == "inf")
+        KELVRA_INF(L"host %s", text.c_str());
+    else if (verb == "err")
+        KELVRA_ERR(L"host %s", text.c_str());
+    else if (verb == "sample-trc" || verb == "sample-inf" || verb == "sample-err")
+        SampleTrace(verb[7], text.c_str());
     else if (verb == "format")
-        KELVRA_INF(L"wide %s narrow %hs number %d", L"w\u00e9", "n", -42);
+        KELVRA_INF(L"wide %s narrow %hs number %d", L"w\u00e9\u4e2d", "n", -42);
     else if (verb == "lasterror")
     {
         ::SetLastError(42);
@@ -105,8 +87,7 @@ bool RunStep(const std::string& step)
         Report("session", CLog::_log != nullptr ? "open" : "closed");
     else if (verb == "open")
     {
-        const std::wstring path = L"c:\\keltrace\\" + text;
-        FILE* file = ::_wfsopen(path.c_str(), L"a", _SH_DENYNO);
+        FILE* file = ::_wfsopen((L"c:\\keltrace\\" + text).c_str(), L"a", _SH_DENYNO);
         Report("open", file != nullptr ? "ok" : "failed");
         if (file != nullptr)
             std::fclose(file);
@@ -116,17 +97,17 @@ bool RunStep(const std::string& step)
         FILE* file = ::_wfopen(L"c:\\keltrace\\debug", L"wb");
         if (file == nullptr)
             return false;
-        std::fwrite(argument.data(), 1, argument.size(), file);
+        std::fputs(argument.c_str(), file);
         std::fclose(file);
     }
     else if (verb == "signal" || verb == "wait")
     {
-        HANDLE event = OpenNamedEvent(argument);
-        if (event == nullptr)
-            return false;
-        const bool done = verb == "signal" ? ::SetEvent(event) != FALSE
-                                           : ::WaitForSingleObject(event, 60000) == WAIT_OBJECT_0;
-        ::CloseHandle(event);
+        const HANDLE event = ::OpenEventW(EVENT_MODIFY_STATE | SYNCHRONIZE, FALSE, text.c_str());
+        const bool done =
+            event != nullptr && (verb == "signal" ? ::SetEvent(event) != FALSE
+                                                  : ::WaitForSingleObject(event, 60000) == WAIT_OBJECT_0);
+        if (event != nullptr)
+            ::CloseHandle(event);
         return done;
     }
     else

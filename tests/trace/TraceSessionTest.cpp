@@ -1,79 +1,53 @@
 // Log sessions in fresh helper processes (TraceChild.exe with Sample.Net.dll): the marker
 // directory, file names, append and truncate, the banner, sharing between processes,
-// process-name failures and the exit notice.
+// process-name failures, the exit notice, and the configuration file c:\keltrace\debug with the
+// module filter across the host program (TraceChild) and its DLL (Sample.Net).
 #include "TraceTestSupport.h"
 
-#include <gtest/gtest.h>
+#include "common/UniqueHandle.h"
 
-#include <string>
-#include <vector>
+#include <algorithm>
+#include <future>
+#include <tuple>
 
 using namespace KelvraTraceTest;
 
 namespace
 {
 
-using Lines = std::vector<std::string>;
-
 const char kExitNotice[] = "TO ELIMINATE THE ABOVE FALSE MEMORY LEAKS PLEASE CALL Debug::stop()\n";
 
-class TraceSession : public testing::Test
-{
-protected:
-    void SetUp() override { CreateEmptyMarkerDirectory(); }
-    void TearDown() override { RemoveMarkerDirectory(); }
-};
-
-size_t CountOf(const std::vector<std::string>& texts, const std::string& text)
-{
-    size_t count = 0;
-    for (const std::string& each : texts)
-        count += each == text ? 1 : 0;
-    return count;
-}
+using TraceSession = MarkerDirectoryTest;
+using TraceConfigured = MarkerDirectoryTest;
 
 } // namespace
 
 TEST(TraceSessionMarker, WithoutTheMarkerDirectoryNothingHappens)
 {
-    RemoveMarkerDirectory();
+    std::filesystem::remove_all(kMarker);
     const ChildResult run = RunChild({"start:net:1:0", "start:net:0:1", "trc:dropped", "session"});
     EXPECT_EQ(run.output, (Lines{"start:ok", "start:ok", "session:closed"}));
-    EXPECT_FALSE(MarkerDirectoryExists());
+    EXPECT_FALSE(std::filesystem::exists(kMarker));
 }
 
 TEST_F(TraceSession, AppendsBannerAndLinesToTheFixedFile)
 {
-    WriteMarkerFile(L"net.log", "old line\r\n");
-    const ChildResult run = RunChild({"start:net:1:0", "lasterror", "trc:first", "inf:second", "err:third",
-                                      "format", "start:other:0:1", "trc:after the second start", "session"});
+    const std::string earlier = "old line\r\n";
+    WriteMarkerFile(L"net.log", earlier);
+    const ChildResult run = RunChild({"start:net:1:0", "lasterror", "trc:first", "inf:second", "format",
+                                      "start:other:0:1", "trc:after the second start", "session"});
     // The first line read the (missing) configuration file, which set the error codes: the
     // caller still sees its own.
     EXPECT_EQ(run.output, (Lines{"start:ok", "lasterror:42 errno 33", "start:ok", "session:open"}));
 
-    // Only the first session's file; no probe file left behind.
+    // Only the first session's file, with one banner; no probe file left behind.
     EXPECT_EQ(MarkerFiles(), std::vector<std::wstring>{L"net.log"});
     const std::string text = ReadMarkerFile(L"net.log");
-    const std::string head = "old line\r\n" + Banner("TraceChild");
-    ASSERT_EQ(text.compare(0, head.size(), head), 0) << text;
-    EXPECT_EQ(text.find("NEW LOG SESSION", head.size()), std::string::npos) << "a second banner";
-
-    const std::vector<TraceLine> lines = ParseTraceLines(text.substr(head.size()));
-    ASSERT_EQ(lines.size(), 6u) << text;
-    const Lines expected = {
-        "ERR between setting and reading the error codes",
-        "TRC host first",
-        "INF host second",
-        "ERR host third",
-        "INF wide w\xe9 narrow n number -42", // Microsoft rules in a host built with C99 printf
-        "TRC host after the second start",
-    };
-    for (size_t i = 0; i < lines.size(); ++i)
-    {
-        EXPECT_EQ(lines[i].tag + " " + lines[i].message, expected[i]);
-        EXPECT_EQ(lines[i].file, "TraceChild.cpp");
-        EXPECT_GT(lines[i].line, 0);
-    }
+    ASSERT_EQ(text.compare(0, earlier.size(), earlier), 0) << text;
+    EXPECT_EQ(SessionLines(text.substr(earlier.size())),
+              (Lines{"ERR between setting and reading the error codes", "TRC host first", "INF host second",
+                     // Microsoft rules in a host built with C99 printf, in the "C" locale
+                     "INF wide w\xe9? narrow n number -42", "TRC host after the second start"}));
 }
 
 TEST_F(TraceSession, PerProcessFileCarriesProcessNameAndId)
@@ -82,63 +56,57 @@ TEST_F(TraceSession, PerProcessFileCarriesProcessNameAndId)
     EXPECT_EQ(run.output, Lines{"start:ok"});
     const std::wstring name = L"tracechild." + std::to_wstring(run.processId) + L".net.log";
     ASSERT_EQ(MarkerFiles(), std::vector<std::wstring>{name});
-    const std::string text = ReadMarkerFile(name);
-    EXPECT_EQ(text.compare(0, Banner("TraceChild").size(), Banner("TraceChild")), 0) << text;
-    EXPECT_EQ(TaggedMessages(text), Lines{"TRC host mine"});
+    EXPECT_EQ(SessionLines(ReadMarkerFile(name)), Lines{"TRC host mine"});
 }
 
 TEST_F(TraceSession, TruncatingSessionKeepsOtherWritersOut)
 {
     WriteMarkerFile(L"shared.log", "content of an earlier run\r\n");
-    const SharedEvent ready("KelvraTraceTestReady");
-    const SharedEvent release("KelvraTraceTestRelease");
-    Child holder({"start:shared:0:0", "trc:holder", "signal:KelvraTraceTestReady",
-                  "wait:KelvraTraceTestRelease", "trc:holder again"});
-    ASSERT_TRUE(ready.Wait(60000));
+    const Kelvra::UniqueEvent ready(::CreateEventW(nullptr, TRUE, FALSE, L"KelvraTraceTestReady"));
+    const Kelvra::UniqueEvent release(::CreateEventW(nullptr, TRUE, FALSE, L"KelvraTraceTestRelease"));
+    const Lines holding = {"start:shared:0:0", "trc:holder", "signal:KelvraTraceTestReady",
+                           "wait:KelvraTraceTestRelease", "trc:holder again"};
+    std::future<ChildResult> holder =
+        std::async(std::launch::async, RunChild, holding, false, L"TraceChild.exe");
+    ASSERT_EQ(::WaitForSingleObject(ready.get(), 60000), WAIT_OBJECT_0);
 
     // Whatever their own mode, other processes cannot open the file for writing now.
-    const ChildResult appending = RunChild({"start:shared:1:0", "trc:lost", "session"});
-    const ChildResult truncating = RunChild({"start:shared:0:0", "session"});
-    release.Set();
-    const ChildResult held = holder.Finish();
-
-    EXPECT_EQ(appending.output, (Lines{"start:Debug::setFile fopen failed", "session:closed"}));
-    EXPECT_EQ(truncating.output, (Lines{"start:Debug::setFile fopen failed", "session:closed"}));
-    EXPECT_EQ(held.exitCode, 0u);
-    const std::string text = ReadMarkerFile(L"shared.log");
-    EXPECT_EQ(text.compare(0, Banner("TraceChild").size(), Banner("TraceChild")), 0) << text;
-    EXPECT_EQ(TaggedMessages(text), (Lines{"TRC host holder", "TRC host holder again"}));
+    const Lines refused = {"start:Debug::setFile fopen failed", "session:closed"};
+    EXPECT_EQ(RunChild({"start:shared:1:0", "trc:lost", "session"}).output, refused);
+    EXPECT_EQ(RunChild({"start:shared:0:0", "session"}).output, refused);
+    ::SetEvent(release.get());
+    holder.wait();
+    EXPECT_EQ(SessionLines(ReadMarkerFile(L"shared.log")),
+              (Lines{"TRC host holder", "TRC host holder again"}));
 }
 
-TEST_F(TraceSession, ProcessFileNameWithoutDotCannotStart)
+TEST_F(TraceSession, ProcessNameFailuresThrowAndCloseTheFileAtOnce)
 {
-    const ChildCopy noDot(L"TraceChildNoDot");
-    const ChildResult run =
-        RunChild({"start:net:1:1", "session", "start:nodot:0:0", "session", "open:nodot.log", "trc:lost"},
-                 false, noDot.Path());
-    const std::string failure = "start:Failed to find the dot extension in the process file name";
-    // The per-process name fails before anything is opened; the fixed name after its file was
-    // opened, which is closed again at once.
-    EXPECT_EQ(run.output, (Lines{failure, "session:closed", failure, "session:closed", "open:ok"}));
-    EXPECT_EQ(MarkerFiles(), std::vector<std::wstring>{L"nodot.log"});
-    EXPECT_EQ(ReadMarkerFile(L"nodot.log"), "");
-}
-
-TEST_F(TraceSession, ProcessFileNameOfOnlyAnExtensionCannotStart)
-{
-    const ChildCopy onlyExtension(L".exe");
-    const ChildResult run = RunChild({"start:net:1:1", "start:dotonly:0:0", "session", "open:dotonly.log"},
-                                     false, onlyExtension.Path());
-    const std::string failure = "start:Failed to find the process name";
-    EXPECT_EQ(run.output, (Lines{failure, failure, "session:closed", "open:ok"}));
-    EXPECT_EQ(MarkerFiles(), std::vector<std::wstring>{L"dotonly.log"});
+    // Copies of TraceChild.exe, the log file name, and what Debug::start throws.
+    const std::tuple<std::wstring, std::string, std::string> cases[] = {
+        {L"TraceChildNoDot", "nodot", "start:Failed to find the dot extension in the process file name"},
+        {L".exe", "dotonly", "start:Failed to find the process name"},
+    };
+    for (const auto& [program, log, failure] : cases)
+    {
+        const std::filesystem::path copy = BesideTestProgram(program);
+        std::filesystem::copy_file(BesideTestProgram(L"TraceChild.exe"), copy,
+                                   std::filesystem::copy_options::overwrite_existing);
+        // The per-process name fails before anything is opened; the fixed name after its file was
+        // opened, which must be closed again at once.
+        const ChildResult run = RunChild(
+            {"start:net:1:1", "start:" + log + ":0:0", "session", "open:" + log + ".log"}, false, program);
+        std::filesystem::remove(copy);
+        EXPECT_EQ(run.output, (Lines{failure, failure, "session:closed", "open:ok"}));
+        EXPECT_EQ(ReadMarkerFile(std::wstring(log.begin(), log.end()) + L".log"), "");
+    }
+    EXPECT_EQ(MarkerFiles(), (std::vector<std::wstring>{L"dotonly.log", L"nodot.log"}));
 }
 
 TEST_F(TraceSession, ExitNoticeOnceWhenTheHostNeverStopped)
 {
-    const ChildResult run = RunChild({"start:net:1:0", "trc:some line"}, true);
-    EXPECT_EQ(CountOf(run.debugStrings, kExitNotice), 1u);
-    EXPECT_EQ(TaggedMessages(ReadMarkerFile(L"net.log")), Lines{"TRC host some line"});
+    const Lines notices = RunChild({"start:net:1:0", "trc:some line"}, true).debugStrings;
+    EXPECT_EQ(std::count(notices.begin(), notices.end(), kExitNotice), 1);
 }
 
 TEST_F(TraceSession, NoExitNoticeAfterStopEvenWhenTheConfigurationNamesModules)
@@ -147,7 +115,52 @@ TEST_F(TraceSession, NoExitNoticeAfterStopEvenWhenTheConfigurationNamesModules)
     WriteMarkerFile(L"debug", "Sample.Net\n");
     const ChildResult run =
         RunChild({"start:net:1:0", "stop", "trc:after stop", "sample-trc:after stop"}, true);
-    EXPECT_EQ(CountOf(run.debugStrings, kExitNotice), 0u);
-    EXPECT_EQ(TaggedMessages(ReadMarkerFile(L"net.log")),
+    EXPECT_EQ(std::count(run.debugStrings.begin(), run.debugStrings.end(), kExitNotice), 0);
+    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")),
               (Lines{"TRC host after stop", "TRC sample after stop"}));
+}
+
+TEST_F(TraceConfigured, LevelsAndNamesFilterTheLinesOfBothModules)
+{
+    const std::pair<std::string, Lines> cases[] = {
+        // First, while no file exists yet: every line of every module.
+        {"", {"TRC host t", "INF host i", "ERR host e", "TRC sample t", "INF sample i", "ERR sample e"}},
+        {"warn\r\ninfo\r\n", {"ERR host e", "ERR sample e"}}, // the highest level wins; CR LF lines
+        {"inf", {"INF host i", "ERR host e", "INF sample i", "ERR sample e"}},
+        // A byte-order mark and a trailing blank make module names of level words: level 0 stays,
+        // and the list shuts Sample.Net out.
+        {"\xEF\xBB\xBFinfo\ninfo \nTraceChild\n", {"TRC host t", "INF host i", "ERR host e"}},
+        {"info\n\n", {}}, // an empty line is a name no module has
+    };
+    for (const auto& [file, written] : cases)
+    {
+        if (!file.empty())
+            WriteMarkerFile(L"debug", file);
+        RunChild(
+            {"start:net:0:0", "trc:t", "inf:i", "err:e", "sample-trc:t", "sample-inf:i", "sample-err:e"});
+        EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")), written) << "[" << file << "]";
+    }
+}
+
+TEST_F(TraceConfigured, NamedModuleAloneTracesUntilStop)
+{
+    WriteMarkerFile(L"debug", "Sample.Net\nSAMPLE.NET\ninfo\n");
+    RunChild({"start:net:1:0", "inf:before", "sample-inf:before", "sample-trc:before", "stop", "inf:after",
+              "trc:after", "sample-inf:after"});
+    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")),
+              (Lines{"INF sample before", "INF host after", "INF sample after"}));
+}
+
+TEST_F(TraceConfigured, ReadBeforeTheSessionStartsTheFilterStillHolds)
+{
+    WriteMarkerFile(L"debug", "Sample.Net\n");
+    RunChild({"configure", "start:net:1:0", "trc:dropped", "sample-trc:kept"});
+    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")), Lines{"TRC sample kept"});
+}
+
+TEST_F(TraceConfigured, NotReadWhileNoSessionIsOpen)
+{
+    // The early line finds no session; the file written after it is the one that counts.
+    RunChild({"trc:early", "config:error", "start:net:1:0", "trc:late", "err:late"});
+    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")), Lines{"ERR host late"});
 }
