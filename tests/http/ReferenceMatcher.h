@@ -1,75 +1,72 @@
-// A second matcher for the tests: a plain recursive interpreter over the syntax tree, with
-// continuations for backtracking. It shares only the parser with the engine (no program, no
-// stack), so the two must agree on every pattern the parser accepts.
+// A second matcher for the tests, and the checks built on it. The reference is a plain recursive
+// interpreter over the syntax tree with continuations for backtracking: it shares only the
+// parser with the engine (no program, no stack), so the two must agree on every pattern the
+// parser accepts.
 #pragma once
 
-#include "http/RegexSyntax.h"
+#include "http/RegexException.h"
 
 #include <gtest/gtest.h>
 
 #include <cstddef>
-#include <functional>
+#include <cstdint>
 #include <string>
-#include <utility>
 #include <vector>
 
 namespace KelvraTest
 {
 
-struct ReferenceSpan
+const wchar_t* const kNoMatch = nullptr;
+const wchar_t* const kNotCaptured = nullptr;
+
+// A pattern, a text, and the match expected: the text matched (or kNoMatch), where it starts,
+// and what each group captured (or kNotCaptured).
+struct MatchRow
 {
-    static constexpr size_t kNone = static_cast<size_t>(-1);
-    size_t start = kNone;
-    size_t end = kNone;
+    const wchar_t* pattern;
+    const wchar_t* text;
+    const wchar_t* match;
+    size_t at;
+    std::vector<const wchar_t*> captures;
 };
 
-struct ReferenceResult
+// Matches each row within a time limit and with a bounded stack (a match that runs away fails its
+// row instead of stalling the program or taking all memory), and checks the result, where the
+// matcher stopped, and agreement with the reference.
+void ExpectMatches(const std::vector<MatchRow>& rows);
+
+// A pattern, a text, and the entries ExtractPatternGroups should give.
+struct ExtractionRow
 {
-    bool matched = false;
-    size_t start = 0;
-    size_t end = 0;
-    std::vector<ReferenceSpan> captures;
+    std::wstring pattern;
+    std::wstring text;
+    std::vector<std::wstring> entries;
 };
 
-class ReferenceMatcher
-{
-public:
-    // text is read up to its first NUL; case is ignored the way the engine ignores it.
-    ReferenceMatcher(const KelvraRegex::SyntaxTree& tree, const std::wstring& text);
+// Extracts each row, checks the entries and agreement with the literal algorithm (for every
+// search position a fresh lowered copy of the rest of the text, and a case-insensitive comparison
+// with each earlier entry).
+void ExpectExtractions(const std::vector<ExtractionRow>& rows);
 
-    // Tries start positions from `from` on, leftmost first; captures carry over from one attempt
-    // to the next, as they do in the engine.
-    ReferenceResult Search(size_t from);
-
-private:
-    using Next = std::function<bool(size_t)>;
-
-    bool Match(const KelvraRegex::Node& node, size_t pos, const Next& next);
-    bool MatchUnits(const KelvraRegex::Node& sequence, size_t index, size_t pos, const Next& next);
-    bool MatchRepeat(const KelvraRegex::Node& repeat, size_t pos, const Next& next);
-    bool GreedyTurns(const KelvraRegex::Node& repeat, size_t pos, const Next& next, bool again);
-    bool LazyTurns(const KelvraRegex::Node& repeat, size_t pos, const Next& next);
-
-    const KelvraRegex::SyntaxTree& m_tree;
-    std::wstring m_text;
-    std::vector<ReferenceSpan> m_captures;
-};
-
-// ExtractPatternGroups done the slow, literal way: for every search position a fresh lowered
-// copy of the rest of the text, and a case-insensitive comparison with each earlier entry.
-// Sets *threw when the engine is expected to throw (a match, but no capture group).
-std::vector<std::wstring> ReferenceExtract(const std::wstring& pattern, const std::wstring& text,
-                                           bool* threw);
-
-// Runs CRegexPattern::Match and the reference matcher on the same pattern and text and compares
-// whether they match, where the match lies and every capture. A pattern that does not compile
-// agrees trivially (the parser is shared).
+// Whether CRegexPattern::Match and the reference agree on whether, where and with which captures
+// the pattern matches the text. A pattern that does not compile agrees trivially.
 testing::AssertionResult AgreesWithReference(const std::wstring& pattern, const std::wstring& text);
 
-// ExtractPatternGroups against ReferenceExtract: the same result, entries and exception.
+// ExtractPatternGroups against the literal algorithm: the same entries and the same exception.
 testing::AssertionResult ExtractionAgreesWithReference(const std::wstring& pattern, const std::wstring& text);
 
-// A pattern or text for a failure message, control characters escaped.
-std::string Printable(const std::wstring& text);
+// The code of the CRegexException that call throws; 0 when it throws none.
+template <typename Call> std::uint32_t ThrownCode(Call call)
+{
+    try
+    {
+        call();
+    }
+    catch (const CRegexException& exception)
+    {
+        return static_cast<std::uint32_t>(exception.Code());
+    }
+    return 0;
+}
 
 } // namespace KelvraTest
