@@ -73,16 +73,6 @@ TEST(Bytes, BothConversionsGiveTheSameAddress)
               static_cast<void*>(static_cast<unsigned char*>(buffer)));
 }
 
-TEST(Bytes, HoldsWhatIsWritten)
-{
-    Bytes buffer(1000);
-    unsigned char* p = buffer;
-    for (int i = 0; i < 1000; ++i)
-        p[i] = static_cast<unsigned char>(i);
-    const unsigned char* q = buffer;
-    EXPECT_EQ(q[999], static_cast<unsigned char>(999));
-}
-
 TEST(Bytes, CopyKeepsTheBlockAliveUntilTheLastOwnerGoes)
 {
     const long baseline = LiveBlocks();
