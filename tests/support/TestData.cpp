@@ -14,7 +14,7 @@ std::wstring DataPath(const std::wstring& name)
     const wchar_t* folder = _wgetenv(L"KELVRA_TEST_DATA");
     if (folder == nullptr)
     {
-        ADD_FAILURE() << "KELVRA_TEST_DATA is not set: run the tests through ctest";
+        ADD_FAILURE() << "KELVRA_TEST_DATA is not set";
         return name;
     }
     return std::wstring(folder) + L"\\" + name;

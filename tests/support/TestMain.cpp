@@ -5,6 +5,7 @@
 #include <windows.h>
 
 #include <cstdio>
+#include <cstdlib>
 
 namespace
 {
@@ -23,6 +24,9 @@ LONG WINAPI ReportCrash(EXCEPTION_POINTERS* info)
 
 int main(int argc, char** argv)
 {
+    // Child processes of the tests inherit it.
+    if (std::getenv("KELVRA_TEST_DATA") == nullptr)
+        _putenv("KELVRA_TEST_DATA=" KELVRA_TEST_DATA_DIR);
     ::SetErrorMode(SEM_FAILCRITICALERRORS | SEM_NOGPFAULTERRORBOX | SEM_NOOPENFILEERRORBOX);
     ::SetUnhandledExceptionFilter(&ReportCrash);
     testing::InitGoogleTest(&argc, argv);
