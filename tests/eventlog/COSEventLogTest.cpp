@@ -106,23 +106,19 @@ TEST_F(EventLog, ConstructionRegistersTheSourceWithThreeCategories)
     EXPECT_EQ(count.number, 3u);
 }
 
-TEST_F(EventLog, AddEventSourceWithoutCategoriesWritesTwoValues)
+TEST_F(EventLog, AddEventSourceWritesCategoryValuesOnlyForCategories)
 {
     COSEventLog log;
-    const wchar_t* source = Created(L"KelvraTest.NoCategories");
-    EXPECT_EQ(log.AddEventSource(source, 0), 0u);
-    EXPECT_EQ(ReadValue(source, L"EventMessageFile").text, ThisProgram());
-    EXPECT_EQ(ReadValue(source, L"TypesSupported").number, 7u);
-    EXPECT_EQ(ReadValue(source, L"CategoryMessageFile").status, ERROR_FILE_NOT_FOUND);
-    EXPECT_EQ(ReadValue(source, L"CategoryCount").status, ERROR_FILE_NOT_FOUND);
-}
+    const wchar_t* none = Created(L"KelvraTest.NoCategories");
+    EXPECT_EQ(log.AddEventSource(none, 0), 0u);
+    EXPECT_EQ(ReadValue(none, L"EventMessageFile").text, ThisProgram());
+    EXPECT_EQ(ReadValue(none, L"TypesSupported").number, 7u);
+    EXPECT_EQ(ReadValue(none, L"CategoryMessageFile").status, ERROR_FILE_NOT_FOUND);
+    EXPECT_EQ(ReadValue(none, L"CategoryCount").status, ERROR_FILE_NOT_FOUND);
 
-TEST_F(EventLog, AddEventSourceStoresTheCategoryCountItIsGiven)
-{
-    COSEventLog log;
-    const wchar_t* source = Created(L"KelvraTest.Twelve");
-    EXPECT_EQ(log.AddEventSource(source, 12), 0u);
-    EXPECT_EQ(ReadValue(source, L"CategoryCount").number, 12u);
+    const wchar_t* twelve = Created(L"KelvraTest.Twelve");
+    EXPECT_EQ(log.AddEventSource(twelve, 12), 0u);
+    EXPECT_EQ(ReadValue(twelve, L"CategoryCount").number, 12u);
 }
 
 TEST_F(EventLog, LongSourceNamesAreRegisteredWhole)

@@ -35,16 +35,12 @@ TEST(EventMessage, LongMessagesAreCutTo4095Characters)
     EXPECT_EQ(message, exact);
 }
 
-TEST(EventMessage, EmptyMessageIsStillAMessage)
+TEST(EventMessage, EmptyMessageIsAMessageButANullFormatIsNot)
 {
     std::wstring message = L"old";
     EXPECT_TRUE(Format(message, L""));
     EXPECT_EQ(message, L"");
-}
-
-TEST(EventMessage, NullFormatIsRefused)
-{
-    std::wstring message = L"old";
+    message = L"old";
     EXPECT_FALSE(Format(message, nullptr));
     EXPECT_EQ(message, L"");
 }

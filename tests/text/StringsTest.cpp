@@ -26,19 +26,14 @@ TEST(StringsFormat, NarrowFollowsMicrosoftRules)
     EXPECT_EQ(Strings::Format("%08.3f", 3.14159), "0003.142");
 }
 
-TEST(StringsFormat, EmptyOutputGivesEmptyString)
+TEST(StringsFormat, EmptyOutputAndAFormattedNulEndTheResult)
 {
     EXPECT_EQ(Strings::Format(L""), L"");
     EXPECT_EQ(Strings::Format(L"%s", L""), L"");
-    EXPECT_EQ(Strings::Format(""), "");
-    EXPECT_EQ(Strings::Format("%s", ""), "");
     EXPECT_EQ(Strings::Format(static_cast<const wchar_t*>(nullptr)), L"");
-    EXPECT_EQ(Strings::Format(static_cast<const char*>(nullptr)), "");
-}
-
-TEST(StringsFormat, ResultEndsAtAFormattedNul)
-{
     EXPECT_EQ(Strings::Format(L"ab%cde", L'\0'), L"ab");
+    EXPECT_EQ(Strings::Format("%s", ""), "");
+    EXPECT_EQ(Strings::Format(static_cast<const char*>(nullptr)), "");
     EXPECT_EQ(Strings::Format("ab%cde", '\0'), "ab");
 }
 
