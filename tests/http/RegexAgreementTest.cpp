@@ -1,11 +1,12 @@
 // The engine against the reference matcher on many random short patterns and texts over a small
-// alphabet. Each run takes a new seed and prints it on failure; KELVRA_RANDOM_SEED=<n> repeats a run.
+// alphabet. The seed is fixed so that every run checks the same cases in the same time (random
+// nested quantifiers can make either matcher take minutes on an unlucky seed, a known limit of
+// backtracking); KELVRA_RANDOM_SEED=<n> explores another seed, and a failure prints its seed.
 #include "http/ReferenceMatcher.h"
 #include "http/RegexPattern.h"
 
 #include <gtest/gtest.h>
 
-#include <chrono>
 #include <cstdlib>
 #include <initializer_list>
 #include <random>
@@ -21,7 +22,7 @@ unsigned SeedForThisRun()
 {
     if (const char* fixed = std::getenv("KELVRA_RANDOM_SEED"))
         return static_cast<unsigned>(std::strtoul(fixed, nullptr, 10));
-    return static_cast<unsigned>(std::chrono::steady_clock::now().time_since_epoch().count());
+    return 20261206;
 }
 
 class PatternGenerator
