@@ -2,7 +2,7 @@
 // the same extraction) in the same run: a realistic 8 KiB header block, a 1 MiB block with 20,000
 // Set-Cookie lines, and a 64 KiB block of near misses against a normal 64 KiB block.
 #include "http/HeaderPatterns.h"
-#include "http/PatternExtraction.h"
+#include "http/pattern/PatternExtraction.h"
 
 #include "BenchSupport.h"
 

@@ -2,7 +2,7 @@
 // the local HTTP server that ctest starts for this program (tests/support/http_server.py).
 #include "common/UniqueHandle.h"
 #include "http/HeaderPatterns.h"
-#include "http/ReferenceMatcher.h"
+#include "http/pattern/ReferenceMatcher.h"
 #include "support/TestData.h"
 
 #include <gtest/gtest.h>

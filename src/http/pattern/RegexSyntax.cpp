@@ -1,4 +1,4 @@
-#include "http/RegexSyntax.h"
+#include "http/pattern/RegexSyntax.h"
 
 #include "KelvraStrings.h"
 

@@ -2,7 +2,7 @@
 // tree. The matcher (RegexPattern.cpp) runs these programs with a backtracking stack.
 #pragma once
 
-#include "http/RegexSyntax.h"
+#include "http/pattern/RegexSyntax.h"
 
 #include <cstdint>
 #include <vector>

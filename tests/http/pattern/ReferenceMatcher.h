@@ -4,7 +4,7 @@
 // parser accepts.
 #pragma once
 
-#include "http/RegexException.h"
+#include "http/pattern/RegexException.h"
 
 #include <gtest/gtest.h>
 

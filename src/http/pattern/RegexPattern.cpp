@@ -1,6 +1,6 @@
-#include "http/RegexPattern.h"
+#include "http/pattern/RegexPattern.h"
 
-#include "http/RegexException.h"
+#include "http/pattern/RegexException.h"
 
 #include <algorithm>
 #include <cwchar>

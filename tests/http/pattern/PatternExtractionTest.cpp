@@ -1,8 +1,8 @@
 // ExtractPatternGroups and TrimChars on texts written out here; HeaderBlockTest.cpp runs the
 // header patterns over header blocks from a real server.
 #include "http/HeaderPatterns.h"
-#include "http/PatternExtraction.h"
-#include "http/ReferenceMatcher.h"
+#include "http/pattern/PatternExtraction.h"
+#include "http/pattern/ReferenceMatcher.h"
 
 #include <gtest/gtest.h>
 

@@ -1,6 +1,6 @@
-#include "http/PatternExtraction.h"
+#include "http/pattern/PatternExtraction.h"
 
-#include "http/RegexPattern.h"
+#include "http/pattern/RegexPattern.h"
 
 #include <new>
 #include <string_view>

@@ -1,7 +1,7 @@
 // The matcher's syntax, one table per construct. Each row is a pattern, a text and the expected
 // match with its captures; every row is also checked against the reference matcher.
-#include "http/ReferenceMatcher.h"
-#include "http/RegexPattern.h"
+#include "http/pattern/ReferenceMatcher.h"
+#include "http/pattern/RegexPattern.h"
 
 #include <gtest/gtest.h>
 

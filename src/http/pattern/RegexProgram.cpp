@@ -1,4 +1,4 @@
-#include "http/RegexProgram.h"
+#include "http/pattern/RegexProgram.h"
 
 #include <algorithm>
 

@@ -2,8 +2,8 @@
 // alphabet. The seed is fixed so that every run checks the same cases in the same time (random
 // nested quantifiers can make either matcher take minutes on an unlucky seed, a known limit of
 // backtracking); KELVRA_RANDOM_SEED=<n> explores another seed, and a failure prints its seed.
-#include "http/ReferenceMatcher.h"
-#include "http/RegexPattern.h"
+#include "http/pattern/ReferenceMatcher.h"
+#include "http/pattern/RegexPattern.h"
 
 #include <gtest/gtest.h>
 

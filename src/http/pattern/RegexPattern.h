@@ -10,7 +10,7 @@
 // Matching finds the leftmost match, resolving choices in the order written (not the longest).
 #pragma once
 
-#include "http/RegexProgram.h"
+#include "http/pattern/RegexProgram.h"
 
 #include <cstddef>
 #include <cstdint>

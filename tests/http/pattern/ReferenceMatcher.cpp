@@ -1,9 +1,9 @@
-#include "http/ReferenceMatcher.h"
+#include "http/pattern/ReferenceMatcher.h"
 
 #include "common/UniqueHandle.h"
-#include "http/PatternExtraction.h"
-#include "http/RegexPattern.h"
-#include "http/RegexSyntax.h"
+#include "http/pattern/PatternExtraction.h"
+#include "http/pattern/RegexPattern.h"
+#include "http/pattern/RegexSyntax.h"
 
 #include <windows.h>
 

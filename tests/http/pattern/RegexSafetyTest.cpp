@@ -1,9 +1,9 @@
 // Hostile or odd input: the matcher never reads past a terminator, never loops forever and never
 // loses a backtracking entry. Loops that must end are table rows: each row runs within a time
 // limit and with a bounded stack, so a loop that never ends fails its row.
-#include "http/PatternExtraction.h"
-#include "http/ReferenceMatcher.h"
-#include "http/RegexPattern.h"
+#include "http/pattern/PatternExtraction.h"
+#include "http/pattern/ReferenceMatcher.h"
+#include "http/pattern/RegexPattern.h"
 
 #include <gtest/gtest.h>
 
