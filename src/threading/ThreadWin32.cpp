@@ -46,7 +46,8 @@ CThreadWin32& CThreadWin32::operator=(const CThreadWin32& other)
         ::DuplicateHandle(process, other.m_thread, process, duplicate.put(), 0, FALSE,
                           DUPLICATE_SAME_ACCESS);
     }
-    Kelvra::UniqueThread previous(std::exchange(m_thread, duplicate.release()));
+    Kelvra::UniqueThread::close(m_thread);
+    m_thread = duplicate.release();
     // Without a handle nothing could ever clear the flag again, and Create would refuse to start.
     if (m_thread == nullptr)
         m_running = false;
@@ -70,26 +71,23 @@ void CThreadWin32::Create()
 {
     if (m_running)
         return;
-    Kelvra::UniqueThread previous(std::exchange(m_thread, nullptr));
-    previous.reset();
+    Kelvra::UniqueThread::close(m_thread);
     m_threadId = 0;
     m_running = true;
     // Started suspended so that the identifier and handle are stored before Run executes: a Run
     // that calls Stop at once must find itself through IsItMe.
-    unsigned int threadId = 0;
-    Kelvra::UniqueThread thread(reinterpret_cast<HANDLE>(
-        ::_beginthreadex(nullptr, 0, &CThreadWin32::ThreadMain, this, CREATE_SUSPENDED, &threadId)));
-    if (!thread)
+    m_thread = reinterpret_cast<HANDLE>(
+        ::_beginthreadex(nullptr, 0, &CThreadWin32::ThreadMain, this, CREATE_SUSPENDED, &m_threadId));
+    if (m_thread == nullptr)
     {
+        m_threadId = 0;
         m_running = false;
         return;
     }
-    m_threadId = threadId;
-    m_thread = thread.release();
     if (::ResumeThread(m_thread) == static_cast<DWORD>(-1))
     {
         ::TerminateThread(m_thread, kTerminatedExitCode);
-        Kelvra::UniqueThread failed(std::exchange(m_thread, nullptr));
+        Kelvra::UniqueThread::close(m_thread);
         m_threadId = 0;
         m_running = false;
     }
