@@ -53,17 +53,16 @@ protected:
 
     // Adopts storage (see above for how to allocate it); null allocates a record as CCritSec().
     explicit CCritSec(_RTL_CRITICAL_SECTION* storage);
-    // Replaces the held record with storage, before InitCritSec: the previous record, which must
-    // not be initialised, is freed. Null or the record already held changes nothing.
+    // Holds storage instead of the current record, before InitCritSec. The replaced record is
+    // neither finalised nor freed: it stays the caller's, to free or to hand back with Init (so
+    // replace only records you supplied). The object frees the record it holds when destroyed.
+    // Null changes nothing.
     void Init(_RTL_CRITICAL_SECTION* storage);
 
 private:
     // Both throw the const char* literal "Not copyable".
     CCritSec(CCritSec& other);
     CCritSec& operator=(CCritSec& other);
-
-    // Lets the library's tests reach the refusing copy operations; hosts have no use for it.
-    friend struct CopyRefusalProbe;
 
     _RTL_CRITICAL_SECTION* m_record;
 };
@@ -91,15 +90,15 @@ protected:
     // Adopts section (deleted with delete through ICritSec) and initialises it; null uses a new
     // CCritSec.
     explicit CLock(ICritSec* section);
-    // Finalises and deletes the held section, then adopts and initialises section instead. Only
-    // while no thread holds the lock. Null or the section already held changes nothing.
+    // Holds section instead of the current one and initialises it; only while no thread holds the
+    // lock. The replaced section is neither finalised nor deleted: it stays the caller's, to hand
+    // back with Init (initialised again) or to finalise and delete. The lock finalises and deletes
+    // only the section it holds when destroyed. Null or the section already held changes nothing.
     void Init(ICritSec* section);
 
 private:
     // Throws the const char* literal "Not implemented".
     CLock(CLock& other);
-
-    friend struct CopyRefusalProbe;
 
     ICritSec* m_section;
 };
@@ -120,8 +119,6 @@ public:
 private:
     // Throws the const char* literal "Not implemented".
     CScopeLock(CScopeLock& other);
-
-    friend struct CopyRefusalProbe;
 
     CLock* m_lock;
 };

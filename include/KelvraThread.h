@@ -94,7 +94,8 @@ public:
 //
 // Run executes on the worker; Stop may also be called from it. Create, Stop, assignment and
 // destruction of one object must not run concurrently with each other. Run must not let an
-// exception escape (the process ends, as with std::thread).
+// exception escape (the process ends, as with std::thread). Run may delete its own object; a
+// derived destructor that calls Stop must then skip it on the worker (if (!IsItMe()) ...).
 class KELVRA_API CThreadWin32
 {
 public:
@@ -111,13 +112,16 @@ public:
     // ends clear.
     CThreadWin32& operator=(const CThreadWin32& other);
     // Stop(5000). A derived class whose Run uses its own members must stop the thread in its own
-    // destructor: by the time this one runs, the derived part is gone.
+    // destructor: by the time this one runs, the derived part is gone. On the worker itself (Run
+    // deleting its object) it only closes the handle: the thread ends with Run's result.
     virtual ~CThreadWin32();
 
     // Starts a thread running Run, unless the running flag is set (then it does nothing). The
     // handle of a previous, finished thread is closed first. The stop request is left as it is:
     // after a Stop it is still set, until cleared with ResetEvent(GetStopRequestEvent()). When
-    // no thread can be started the object stays idle, with the running flag clear.
+    // no thread can be started the object stays idle, with the running flag clear. The object may
+    // be destroyed as soon as Create returns: a thread that has not reached Run by then ends
+    // without running it.
     void Create();
     // Does nothing without a thread handle. Otherwise sets the stop request; called from the
     // worker itself, ends it at once with exit code 0xA5A5A5A5 (no return, no stack unwinding).
@@ -151,8 +155,10 @@ public:
     void* GetStopRequestEvent();
 
 protected:
-    // The thread body; its result becomes the thread's exit code.
-    virtual unsigned int Run() = 0;
+    // The thread body, supplied by the derived class; its result becomes the thread's exit code.
+    // This class's own version runs only on a thread whose object lost its derived part before the
+    // thread got to Run: it returns 0xA5A5A5A5 at once.
+    virtual unsigned int Run();
     // True on the thread this object started, while it holds the thread's handle.
     bool IsItMe() const;
 

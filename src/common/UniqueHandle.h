@@ -39,7 +39,15 @@ public:
     // Closes what is held (if anything) and takes value.
     void reset(pointer value = Traits::invalid()) noexcept
     {
-        const pointer old = std::exchange(m_value, value);
+        close(m_value);
+        m_value = value;
+    }
+
+    // For a handle kept in a plain field, where an exported class's layout fixes the field's type:
+    // closes what the field holds (if anything) and empties it.
+    static void close(pointer& field) noexcept
+    {
+        const pointer old = std::exchange(field, Traits::invalid());
         if (old != Traits::invalid())
             Traits::close(old);
     }

@@ -54,10 +54,8 @@ CCritSec::~CCritSec()
 
 void CCritSec::Init(_RTL_CRITICAL_SECTION* storage)
 {
-    if (storage == nullptr || storage == m_record)
-        return;
-    FreeRecord(m_record);
-    m_record = storage;
+    if (storage != nullptr)
+        m_record = storage;
 }
 
 void CCritSec::InitCritSec()

@@ -1,4 +1,5 @@
 #include "KelvraThread.h"
+#include "common/UniqueHandle.h"
 #include "threading/WaitTimeout.h"
 
 #include <windows.h>
@@ -22,8 +23,7 @@ CGlobalBooleanFx2::CGlobalBooleanFx2(const CGlobalBooleanFx2&) : m_event(nullptr
 
 CGlobalBooleanFx2::~CGlobalBooleanFx2()
 {
-    if (m_event != nullptr)
-        ::CloseHandle(m_event);
+    Kelvra::UniqueEvent::close(m_event);
 }
 
 void CGlobalBooleanFx2::operator=(const CGlobalBooleanFx2& other)

@@ -30,9 +30,6 @@ void CLock::Init(ICritSec* section)
 {
     if (section == nullptr || section == m_section)
         return;
-    // The lock owns the section it replaces: finalise and delete it rather than leak it.
-    m_section->DeleteCritSec();
-    delete m_section;
     m_section = section;
     m_section->InitCritSec();
 }

@@ -20,6 +20,10 @@ constexpr int kDestructorStopTimeout = 5000;
 // TerminateThread only starts the termination; this bounds the wait for it to complete.
 constexpr DWORD kTerminationWait = 2000;
 
+// The object whose Run this thread executes. Emptied by the object's destructor when Run deletes
+// its own object, so that the thread does not touch the object once Run returns.
+thread_local const CThreadWin32* t_object = nullptr;
+
 } // namespace
 
 CThreadWin32::CThreadWin32() : m_threadId(0), m_thread(nullptr) {}
@@ -46,7 +50,8 @@ CThreadWin32& CThreadWin32::operator=(const CThreadWin32& other)
         ::DuplicateHandle(process, other.m_thread, process, duplicate.put(), 0, FALSE,
                           DUPLICATE_SAME_ACCESS);
     }
-    Kelvra::UniqueThread previous(std::exchange(m_thread, duplicate.release()));
+    Kelvra::UniqueThread::close(m_thread);
+    m_thread = duplicate.release();
     // Without a handle nothing could ever clear the flag again, and Create would refuse to start.
     if (m_thread == nullptr)
         m_running = false;
@@ -55,14 +60,32 @@ CThreadWin32& CThreadWin32::operator=(const CThreadWin32& other)
 
 CThreadWin32::~CThreadWin32()
 {
+    // On the worker itself (Run deleting its object) stopping would end the thread on its way
+    // out of Run, leaking the object and losing Run's result: release only.
+    if (IsItMe())
+    {
+        if (t_object == this)
+            t_object = nullptr;
+        Kelvra::UniqueThread::close(m_thread);
+        return;
+    }
     Stop(kDestructorStopTimeout);
+}
+
+// A new thread reaches this version instead of the derived body when the object's derived part
+// was destroyed before the thread got to Run: there is no body left to run.
+unsigned int CThreadWin32::Run()
+{
+    return kSelfStopExitCode;
 }
 
 unsigned int __stdcall CThreadWin32::ThreadMain(void* self)
 {
     CThreadWin32* thread = static_cast<CThreadWin32*>(self);
+    t_object = thread;
     const unsigned int exitCode = thread->Run();
-    thread->m_running = false;
+    if (t_object == thread)
+        thread->m_running = false;
     return exitCode;
 }
 
@@ -70,26 +93,23 @@ void CThreadWin32::Create()
 {
     if (m_running)
         return;
-    Kelvra::UniqueThread previous(std::exchange(m_thread, nullptr));
-    previous.reset();
+    Kelvra::UniqueThread::close(m_thread);
     m_threadId = 0;
     m_running = true;
     // Started suspended so that the identifier and handle are stored before Run executes: a Run
     // that calls Stop at once must find itself through IsItMe.
-    unsigned int threadId = 0;
-    Kelvra::UniqueThread thread(reinterpret_cast<HANDLE>(
-        ::_beginthreadex(nullptr, 0, &CThreadWin32::ThreadMain, this, CREATE_SUSPENDED, &threadId)));
-    if (!thread)
+    m_thread = reinterpret_cast<HANDLE>(
+        ::_beginthreadex(nullptr, 0, &CThreadWin32::ThreadMain, this, CREATE_SUSPENDED, &m_threadId));
+    if (m_thread == nullptr)
     {
+        m_threadId = 0;
         m_running = false;
         return;
     }
-    m_threadId = threadId;
-    m_thread = thread.release();
     if (::ResumeThread(m_thread) == static_cast<DWORD>(-1))
     {
         ::TerminateThread(m_thread, kTerminatedExitCode);
-        Kelvra::UniqueThread failed(std::exchange(m_thread, nullptr));
+        Kelvra::UniqueThread::close(m_thread);
         m_threadId = 0;
         m_running = false;
     }

@@ -259,6 +259,33 @@ TEST_F(ThreadWin32, DestroyingAWorkerThatIgnoresTheRequestTakesAboutFiveSeconds)
     EXPECT_EQ(kTerminated, probe.ExitCode(0));
 }
 
+TEST_F(ThreadWin32, DestroyingRightAfterCreateIsSafe)
+{
+    // Worker does not stop the thread in its own destructor: the new thread may reach Run only once the
+    // derived part is gone.
+    for (int cycle = 0; cycle < 20; ++cycle)
+        EXPECT_LT(Milliseconds([&] { Worker(probe, &Cooperate).Create(); }), 5000u) << "cycle " << cycle;
+}
+
+TEST_F(ThreadWin32, RunMayDeleteItsOwnObject)
+{
+    // A first thread, so that what the runtime sets up once per process is not counted.
+    worker.StartAndWait();
+    worker.Stop(kPatientTimeout);
+    probe.self.reset();
+    const unsigned long handlesBefore = OpenHandleCount();
+    const Worker::Body deleteItself = [](Worker& self, WorkerProbe&) -> unsigned int
+    {
+        delete &self;
+        return 9;
+    };
+    (new Worker(probe, deleteItself))->Create();
+    ASSERT_TRUE(probe.started.Wait(5000));
+    EXPECT_EQ(9u, probe.ExitCode()) << "the destructor ended the thread it ran on";
+    probe.self.reset();
+    EXPECT_EQ(handlesBefore, OpenHandleCount()) << "the thread handle or an event leaked";
+}
+
 TEST_F(ThreadWin32, AssignmentTakesAHandleOfItsOwn)
 {
     const unsigned long handlesBefore = OpenHandleCount();
