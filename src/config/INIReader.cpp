@@ -1,8 +1,8 @@
 #include "KelvraIni.h"
-#include "KelvraStrings.h"
 
 #include "common/UniqueHandle.h"
 #include "config/IniParser.h"
+#include "text/AsciiCase.h"
 
 #include <charconv>
 #include <cmath>
@@ -10,24 +10,16 @@
 #include <cwchar>
 #include <string>
 
-using KelvraStrings::Strings;
-
 namespace
 {
 
 // One allocation per key: the reader builds a key for every pair it stores and every look-up.
-// The letters are lowered in place, as Strings::ToLower would do it, because ToLower hands back
-// a second copy.
 std::wstring BuildKey(const wchar_t* section, size_t sectionLength, const wchar_t* name, size_t nameLength)
 {
     std::wstring key;
     key.reserve(sectionLength + 1 + nameLength);
     key.append(section, sectionLength).append(1, L'.').append(name, nameLength);
-    for (wchar_t& c : key)
-    {
-        if (c >= L'A' && c <= L'Z')
-            c = static_cast<wchar_t>(c + (L'a' - L'A'));
-    }
+    Kelvra::LowerAscii(key);
     return key;
 }
 
@@ -166,7 +158,7 @@ double INIReader::GetReal(std::wstring section, std::wstring name, double defaul
 bool INIReader::GetBoolean(std::wstring section, std::wstring name, bool defaultValue) const
 {
     std::wstring text = Get(std::move(section), std::move(name), std::wstring());
-    Strings::ToLower(text);
+    Kelvra::LowerAscii(text);
     if (text == L"true" || text == L"yes" || text == L"on" || text == L"1")
         return true;
     if (text == L"false" || text == L"no" || text == L"off" || text == L"0")

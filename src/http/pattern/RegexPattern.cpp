@@ -1,6 +1,7 @@
 #include "http/pattern/RegexPattern.h"
 
 #include "http/pattern/RegexException.h"
+#include "text/AsciiCase.h"
 
 #include <algorithm>
 #include <cwchar>
@@ -13,16 +14,12 @@ using KelvraRegex::OpCode;
 namespace KelvraRegex
 {
 
-// One pass and one allocation: this copy is made once per scan of a header block, which may be
-// large, so it does not go through Strings::ToLower and its extra copy.
+// One allocation: this copy is made once per scan of a header block, which may be large, so it
+// does not go through Strings::ToLower and its extra copy. The copy takes the terminator too.
 LoweredText::LoweredText(const wchar_t* original)
-    : m_original(original), m_length(std::wcslen(original)), m_lowered(m_length + 1, L'\0')
+    : m_original(original), m_length(std::wcslen(original)), m_lowered(original, m_length + 1)
 {
-    for (size_t i = 0; i < m_length; ++i)
-    {
-        const wchar_t c = original[i];
-        m_lowered[i] = c >= L'A' && c <= L'Z' ? static_cast<wchar_t>(c - L'A' + L'a') : c;
-    }
+    Kelvra::LowerAscii(m_lowered);
 }
 
 } // namespace KelvraRegex
