@@ -146,7 +146,8 @@ size_t NextCandidate(const wchar_t* text, size_t length, size_t from, wchar_t le
 } // namespace
 
 // Every read of the text checks the position against length, so nothing past the terminator is
-// read whatever the program does. The stack lives in locals while the program runs.
+// read whatever the program does. The stack lives in locals while the program runs. Each case
+// of the switch either goes on (continue), ends the run (return) or fails (goto fail).
 bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexMatchContext& context,
                         size_t& position) const
 {
@@ -160,7 +161,6 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
     size_t capacity = context.m_stack.size();
     size_t depth = 0;
     size_t pc = 0;
-    bool matched = false;
 
     // An attempt that would fail at once on its leading character is not started at all.
     size_t pos = NextCandidate(text, length, from, leading);
@@ -170,11 +170,16 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
         return false;
     }
 
+    const auto finish = [&](bool matched)
+    {
+        context.m_depth = depth;
+        position = pos;
+        return matched;
+    };
     const auto push = [&](std::uint64_t value)
     {
         if (++depth >= capacity)
         {
-            context.m_depth = depth - 1;
             if (!context.Grow(depth))
             {
                 --depth;
@@ -208,13 +213,13 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
         case OpCode::Char:
             // Char 0 matches the terminator and steps past it.
             if (pos > length || text[pos] != static_cast<wchar_t>(operand))
-                break;
+                goto fail;
             ++pos;
             ++pc;
             continue;
         case OpCode::AnyChar:
             if (pos >= length)
-                break;
+                goto fail;
             ++pos;
             ++pc;
             continue;
@@ -222,7 +227,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
         case OpCode::NotCharClass:
         {
             if (pos >= length)
-                break;
+                goto fail;
             const std::uint64_t c = static_cast<std::uint16_t>(text[pos]);
             const size_t boundsEnd = std::min(static_cast<size_t>(operand), count);
             bool inside = false;
@@ -235,7 +240,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
                 }
             }
             if (inside != (instruction.op == OpCode::CharClass))
-                break;
+                goto fail;
             ++pos;
             pc = static_cast<size_t>(operand);
             continue;
@@ -244,21 +249,22 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             pc = static_cast<size_t>(operand);
             continue;
         case OpCode::Branch:
-            // A target whose every way fails on this character would only be tried and undone.
+            // A target whose every way fails on this character would only be tried and undone
+            // (the rule stated with the code templates in RegexProgram.cpp).
             if (pos <= length && !m_program.branchFirstChars[pc].Admits(text[pos]))
             {
                 ++pc;
                 continue;
             }
             if (!push(pc + 1))
-                goto finished;
+                return finish(false);
             pc = static_cast<size_t>(operand);
             continue;
         case OpCode::Backtrack:
-            break;
+            goto fail;
         case OpCode::PushPos:
             if (!push(pos))
-                goto finished;
+                return finish(false);
             ++pc;
             continue;
         case OpCode::PopPos:
@@ -267,7 +273,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         case OpCode::PushSlot:
             if (!push(slots[operand]))
-                goto finished;
+                return finish(false);
             ++pc;
             continue;
         case OpCode::PopSlot:
@@ -292,7 +298,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         case OpCode::FailIfNoProgress:
             if (pos == slots[operand])
-                break;
+                goto fail;
             ++pc;
             continue;
         case OpCode::GroupStart:
@@ -305,7 +311,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         case OpCode::PushGroup:
             if (!push(captures[operand].start) || !push(captures[operand].end))
-                goto finished;
+                return finish(false);
             ++pc;
             continue;
         case OpCode::PopGroup:
@@ -325,7 +331,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             while (i < n && pos + i < length && text[pos + i] == text[span.start + i])
                 ++i;
             if (i < n)
-                break;
+                goto fail;
             pos += n;
             ++pc;
             continue;
@@ -338,7 +344,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             if (next >= length)
             {
                 pos = length;
-                goto finished;
+                return finish(false);
             }
             depth = 0;
             pos = next;
@@ -346,17 +352,13 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         }
         case OpCode::Stop:
-            goto finished;
+            return finish(false);
         case OpCode::Accept:
             context.m_matchEnd = pos;
-            matched = true;
-            goto finished;
+            return finish(true);
         }
-        // Every case that does not continue has failed: backtrack.
+    fail:
+        // Backtrack: resume at the instruction index on top of the stack.
         pc = static_cast<size_t>(pop());
     }
-finished:
-    context.m_depth = depth;
-    position = pos;
-    return matched;
 }
