@@ -7,13 +7,12 @@
 namespace Kelvra
 {
 
+// Every unit is written back, changed or not: the compiler then turns the loop into vector code,
+// which matters for the matcher's copy of a whole header block.
 inline void LowerAscii(std::wstring& text)
 {
     for (wchar_t& c : text)
-    {
-        if (c >= L'A' && c <= L'Z')
-            c = static_cast<wchar_t>(c + (L'a' - L'A'));
-    }
+        c = c >= L'A' && c <= L'Z' ? static_cast<wchar_t>(c + (L'a' - L'A')) : c;
 }
 
 } // namespace Kelvra
