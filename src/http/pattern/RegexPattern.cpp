@@ -170,10 +170,12 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
         return false;
     }
 
-    const auto finish = [&](bool matched)
+    // The stack depth and the position come by value: a capture by reference would keep them
+    // out of registers for the whole loop.
+    const auto finish = [&context, &position](size_t endDepth, size_t endPosition, bool matched)
     {
-        context.m_depth = depth;
-        position = pos;
+        context.m_depth = endDepth;
+        position = endPosition;
         return matched;
     };
     const auto push = [&](std::uint64_t value)
@@ -257,14 +259,14 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
                 continue;
             }
             if (!push(pc + 1))
-                return finish(false);
+                return finish(depth, pos, false);
             pc = static_cast<size_t>(operand);
             continue;
         case OpCode::Backtrack:
             goto fail;
         case OpCode::PushPos:
             if (!push(pos))
-                return finish(false);
+                return finish(depth, pos, false);
             ++pc;
             continue;
         case OpCode::PopPos:
@@ -273,7 +275,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         case OpCode::PushSlot:
             if (!push(slots[operand]))
-                return finish(false);
+                return finish(depth, pos, false);
             ++pc;
             continue;
         case OpCode::PopSlot:
@@ -311,7 +313,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         case OpCode::PushGroup:
             if (!push(captures[operand].start) || !push(captures[operand].end))
-                return finish(false);
+                return finish(depth, pos, false);
             ++pc;
             continue;
         case OpCode::PopGroup:
@@ -344,7 +346,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             if (next >= length)
             {
                 pos = length;
-                return finish(false);
+                return finish(depth, pos, false);
             }
             depth = 0;
             pos = next;
@@ -352,10 +354,10 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         }
         case OpCode::Stop:
-            return finish(false);
+            return finish(depth, pos, false);
         case OpCode::Accept:
             context.m_matchEnd = pos;
-            return finish(true);
+            return finish(depth, pos, true);
         }
     fail:
         // Backtrack: resume at the instruction index on top of the stack.
