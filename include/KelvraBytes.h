@@ -4,6 +4,7 @@
 #include "KelvraApi.h"
 
 #include <cstdint>
+#include <new>
 
 // Owns one uninitialised block of a size fixed at construction (the size is not kept).
 // Copies and assignments share the block: it is released when the last Bytes that refers to it
@@ -13,8 +14,8 @@ class KELVRA_API Bytes
 {
 public:
     // Throws std::bad_alloc when the block cannot be allocated. A size of 0 still gives a
-    // unique, non-null pointer that must not be dereferenced.
-    explicit Bytes(std::uint32_t size);
+    // unique, non-null pointer that must not be dereferenced. Implicit, as documented: Bytes b = 4096;
+    Bytes(std::uint32_t size);
     Bytes(const Bytes& other);
     ~Bytes();
     // Afterwards both buffers give the same address; the block this one held is released if

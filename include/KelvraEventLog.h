@@ -25,16 +25,18 @@ public:
     // Writes HKLM\SYSTEM\CurrentControlSet\Services\EventLog\Application\<name>:
     // EventMessageFile (this process's executable) and TypesSupported = 7, plus
     // CategoryMessageFile and CategoryCount when categoryCount > 0. Returns 0 or the Windows
-    // error code of the step that failed (87 for a null name).
+    // error code of the step that failed; 87, touching nothing, for a null or empty name or one
+    // holding a backslash.
     unsigned long AddEventSource(const wchar_t* name, unsigned long categoryCount);
     // Deletes that key (it must have no subkeys). Returns 0 or the Windows error code, 2 for a
-    // name never registered.
+    // name never registered, 87 (as above) for a name that is no source name.
     unsigned long RemoveEventSource(const wchar_t* name);
 
     // Reports one entry with the current user's security identifier. type: 1 error, 2 warning,
     // 4 information, 8 audit success, 16 audit failure; category from 1. The message is
-    // printf-style with Microsoft rules (%s takes a wide string) and is cut to 4095 characters.
-    // False when no source is open, the format cannot be expanded or the report fails.
+    // printf-style with Microsoft rules (%s takes a wide string), formatted into a buffer of
+    // 4096 characters and so cut to 4095. False when no source is open, the format cannot be
+    // expanded or the report fails. Never throws.
     bool Log(unsigned short type, unsigned short category, unsigned long eventId, const wchar_t* format, ...);
 
 protected:

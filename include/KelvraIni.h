@@ -21,10 +21,14 @@
 //   UTF-8 they end letters such as U+00C5 and U+00E0.
 // - A read takes at most 199 characters and line numbers count reads, so a longer line uses one
 //   number per 199 characters (a line of exactly 199 uses two: its line end is read alone).
-//   Only the first 199 characters of a longer line are parsed: it is kept when it is a comment,
-//   a header closed there or a pair whose value ends at an inline comment there, and is a bad
-//   line otherwise (its value is never cut short, its tail never becomes a pair).
+//   Only the first 199 characters of a longer line are parsed: it is kept when its content ends
+//   there (a comment, a header closed there, a pair or continuation with only blanks beyond,
+//   or a pair whose inline comment starts there or beyond), and is a bad line otherwise (its
+//   value is never cut short, its tail never becomes a pair).
 // - Section names and names longer than 49 characters are not cut: their line is bad.
+// - Nothing after such a refused line is filed under an earlier name or section: indented lines
+//   after a refused pair continue nothing, and pairs after a refused header are dropped up to
+//   the next good header.
 //
 // Queries only read the table: several threads may query one reader as long as none assigns to
 // it meanwhile.

@@ -5,6 +5,8 @@
 
 #include "KelvraApi.h"
 
+#include <new>
+
 // The platform's critical section record (CRITICAL_SECTION in <windows.h>).
 struct _RTL_CRITICAL_SECTION;
 

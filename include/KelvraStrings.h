@@ -6,6 +6,7 @@
 #include "KelvraApi.h"
 
 #include <cstdint>
+#include <stdexcept>
 #include <string>
 #include <vector>
 

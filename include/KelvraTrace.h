@@ -16,6 +16,7 @@
 #include <cstdarg>
 #include <cstddef>
 #include <cstdio>
+#include <stdexcept>
 #include <string>
 #include <type_traits>
 #include <vector>

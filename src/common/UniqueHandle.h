@@ -5,6 +5,7 @@
 #include <windows.h>
 #include <winhttp.h>
 
+#include <clocale>
 #include <cstdio>
 #include <utility>
 
@@ -123,6 +124,14 @@ struct LocalMemoryTraits
     static void close(pointer value) noexcept { ::LocalFree(value); }
 };
 
+// A C runtime locale object from _create_locale.
+struct CrtLocaleTraits
+{
+    using pointer = _locale_t;
+    static pointer invalid() noexcept { return nullptr; }
+    static void close(pointer value) noexcept { _free_locale(value); }
+};
+
 using UniqueEvent = UniqueHandle<KernelHandleTraits>;
 using UniqueMutex = UniqueHandle<KernelHandleTraits>;
 using UniqueThread = UniqueHandle<KernelHandleTraits>;
@@ -134,5 +143,6 @@ using UniqueEventSource = UniqueHandle<EventSourceTraits>;
 using UniqueWinHttp = UniqueHandle<WinHttpHandleTraits>;
 using UniqueGlobalText = UniqueHandle<GlobalTextTraits>;
 using UniqueLocalMemory = UniqueHandle<LocalMemoryTraits>;
+using UniqueCrtLocale = UniqueHandle<CrtLocaleTraits>;
 
 } // namespace Kelvra

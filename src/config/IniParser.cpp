@@ -69,6 +69,22 @@ bool LineGoesOn(std::FILE* stream)
     return next != L'\n';
 }
 
+enum class Piece
+{
+    End,   // nothing more to read
+    Whole, // the read holds the rest of its physical line
+    Cut,   // the physical line goes on beyond the read
+};
+
+// What a physical line holds beyond its first read.
+enum class Rest
+{
+    None,          // nothing: the line ended within the read
+    Blank,         // white space only
+    InlineComment, // white space, then an inline comment
+    Text,          // more of the line's content
+};
+
 class Parser
 {
 public:
@@ -77,79 +93,137 @@ public:
     int Run(std::FILE* stream)
     {
         wchar_t line[kLineSize];
-        bool inTail = false;
         for (;;)
         {
-            // fgetws writes its terminating NUL into the last slot only when a read fills the
-            // buffer; the line itself may hold NUL characters, so its length cannot tell.
-            line[kLineSize - 1] = L'\x1';
-            if (std::fgetws(line, kLineSize, stream) == nullptr)
+            const Piece piece = Read(stream, line);
+            if (piece == Piece::End)
                 return m_firstError;
-            if (m_lineNumber < INT_MAX)
-                ++m_lineNumber;
-            const bool filled = line[kLineSize - 1] == L'\0' && line[kLineSize - 2] != L'\n';
-            const bool cut = filled && LineGoesOn(stream);
-            if (!inTail && !ParseLine(line, cut) && m_firstError == 0)
-                m_firstError = m_lineNumber;
-            inTail = cut;
+            const int lineNumber = m_lineNumber;
+            const Rest rest =
+                piece == Piece::Cut ? SkipRest(stream, IsSpace(line[kLineSize - 2])) : Rest::None;
+            if (!ParseLine(line, lineNumber == 1, rest) && m_firstError == 0)
+                m_firstError = lineNumber;
         }
     }
 
 private:
-    // Parses one read; `cut` says that the physical line goes on beyond it. False: a bad line.
-    bool ParseLine(wchar_t* line, bool cut)
+    // Reads at most 199 characters of the stream, which count as one line.
+    Piece Read(std::FILE* stream, wchar_t (&piece)[kLineSize])
+    {
+        // fgetws writes its terminating NUL into the last slot only when a read fills the
+        // buffer; the line itself may hold NUL characters, so its length cannot tell.
+        piece[kLineSize - 1] = L'\x1';
+        if (std::fgetws(piece, kLineSize, stream) == nullptr)
+            return Piece::End;
+        if (m_lineNumber < INT_MAX)
+            ++m_lineNumber;
+        const bool filled = piece[kLineSize - 1] == L'\0' && piece[kLineSize - 2] != L'\n';
+        return filled && LineGoesOn(stream) ? Piece::Cut : Piece::Whole;
+    }
+
+    // Reads the rest of a cut line and tells what it holds. afterSpace: the first read ended in
+    // white space, so that a ';' right at the start of the rest opens an inline comment.
+    Rest SkipRest(std::FILE* stream, bool afterSpace)
+    {
+        wchar_t piece[kLineSize];
+        Rest rest = Rest::Blank;
+        Piece read = Piece::Cut;
+        while (read == Piece::Cut && (read = Read(stream, piece)) != Piece::End)
+        {
+            for (const wchar_t* c = piece; rest == Rest::Blank && *c != L'\0'; ++c)
+            {
+                if (*c == L';' && afterSpace)
+                    rest = Rest::InlineComment;
+                else if (!IsSpace(*c))
+                    rest = Rest::Text;
+                afterSpace = true;
+            }
+        }
+        return rest;
+    }
+
+    // Parses the first read of a line; rest tells what the line holds beyond it. False: a bad
+    // line.
+    bool ParseLine(wchar_t* line, bool firstLine, Rest rest)
     {
         wchar_t* start = line;
-        if (m_lineNumber == 1 && start[0] == 0xEF && start[1] == 0xBB && start[2] == 0xBF)
+        if (firstLine && start[0] == 0xEF && start[1] == 0xBB && start[2] == 0xBF)
             start += 3; // a UTF-8 byte-order mark, read byte by byte
         StripTrailingSpace(start);
         start = SkipSpace(start);
         if (*start == L';' || *start == L'#')
             return true;
-        if (m_previousName[0] != L'\0' && *start != L'\0' && start > line)
-            // A continuation is handed over whole, inline comments included: a cut one is
-            // incomplete.
-            return !cut && Report(m_previousName, start);
+        if (m_sectionRefused && *start != L'[')
+            return true; // no known section: its header's line is the error
+        if (*start != L'\0' && start > line)
+        {
+            // An indented line continues the previous pair, whole, inline comments included.
+            if (m_pairRefused)
+                return true; // the refused line is the error
+            if (m_previousName[0] != L'\0')
+                return rest == Rest::None || rest == Rest::Blank ? Report(m_previousName, start)
+                                                                 : RefusePair();
+        }
         if (*start == L'[')
-            return ParseHeader(start);
+            return ParseHeader(start, rest);
         if (*start == L'\0')
-            return !cut; // blank so far, but what the line holds lies beyond this read
-        return ParsePair(start, cut);
+            return rest != Rest::Text || RefusePair(); // blank in this read, but not beyond it
+        return ParsePair(start, rest);
     }
 
-    bool ParseHeader(wchar_t* start)
+    bool ParseHeader(wchar_t* start, Rest rest)
     {
         wchar_t* end = ScanFor(start + 1, L']');
         if (*end != L']')
-            return false;
+            return rest == Rest::Text ? RefuseHeader() : false;
         *end = L'\0';
         if (!CopyName(m_section, start + 1))
-            return false;
+            return RefuseHeader();
         m_previousName[0] = L'\0';
+        m_pairRefused = false;
+        m_sectionRefused = false;
         return true;
     }
 
-    bool ParsePair(wchar_t* start, bool cut)
+    bool ParsePair(wchar_t* start, Rest rest)
     {
         wchar_t* separator = ScanFor(start, L'=');
         if (*separator != L'=')
         {
             separator = ScanFor(start, L':');
             if (*separator != L':')
-                return false;
+                return rest == Rest::Text ? RefusePair() : false;
         }
         *separator = L'\0';
         StripTrailingSpace(start);
         wchar_t* value = SkipSpace(separator + 1);
         wchar_t* valueEnd = ScanFor(value, L'\0');
-        const bool commentFollows = *valueEnd == L';';
-        if (cut && !commentFollows)
-            return false; // the value goes on beyond this read
+        if (*valueEnd != L';' && rest == Rest::Text)
+            return RefusePair(); // the value goes on beyond this read
         *valueEnd = L'\0';
         StripTrailingSpace(value);
         if (!CopyName(m_previousName, start))
-            return false;
+            return RefusePair();
+        m_pairRefused = false;
         return Report(start, value);
+    }
+
+    // A line the parser does not take because of its own limits (read size, name size). What
+    // follows must not be filed under the names before it: a refused pair ends the previous
+    // pair, and a refused header leaves no known section until the next good one.
+    bool RefusePair()
+    {
+        m_previousName[0] = L'\0';
+        m_pairRefused = true;
+        return false;
+    }
+
+    bool RefuseHeader()
+    {
+        m_previousName[0] = L'\0';
+        m_pairRefused = false;
+        m_sectionRefused = true;
+        return false;
     }
 
     bool Report(const wchar_t* name, const wchar_t* value)
@@ -161,6 +235,8 @@ private:
     void* m_user;
     wchar_t m_section[kNameSize] = L"";
     wchar_t m_previousName[kNameSize] = L"";
+    bool m_pairRefused = false;
+    bool m_sectionRefused = false;
     int m_lineNumber = 0;
     int m_firstError = 0;
 };

@@ -21,13 +21,17 @@ using IniHandler = int (*)(void* user, const wchar_t* section, const wchar_t* na
 // - White space is U+0009..U+000D and U+0020 only. U+0085 and U+00A0 are not, because they
 //   arrive here as the bytes 0x85 and 0xA0, which are also the last bytes of UTF-8 letters
 //   such as U+00C5 and U+00E0: stripping them would cut such letters in half.
-// - A section name or a pair's name longer than 49 characters makes its line bad: nothing is
-//   cut, and the current section and the previous name stay as they were.
 // - A physical line longer than 199 characters is read in pieces that keep one line number
-//   each, but only its first piece is parsed: a comment, a header closed there, or a pair
-//   whose value ends at an inline comment there is taken; anything else is a bad line. The
-//   other pieces are skipped rather than parsed as lines of their own, so the tail of a long
-//   value never turns into a pair.
+//   each, but only its first piece is parsed; the other pieces are skipped rather than parsed
+//   as lines of their own, so the tail of a long value never turns into a pair. The line is
+//   taken when its content ends in the first piece: a comment, a header closed there, or a
+//   pair or continuation whose text ends there, with at most white space (and, after a pair,
+//   an inline comment) beyond it. Otherwise the line is refused as a bad line.
+// - A section name or a pair's name longer than 49 characters is refused too: nothing is cut.
+// - Nothing after a refused line is filed under a name or section before it. A refused pair
+//   (or continuation) ends the previous pair: indented lines after it continue nothing and are
+//   dropped. A refused header leaves no known section: the lines up to the next good header
+//   are dropped (the header's line is the error).
 int ParseIniStream(std::FILE* stream, IniHandler handler, void* user);
 
 } // namespace Kelvra

@@ -2,21 +2,29 @@
 
 #include "common/UniqueHandle.h"
 #include "eventlog/EventMessage.h"
-#include "text/FormatArguments.h"
 
-#include <memory>
+#include <cerrno>
+#include <cstdio>
+#include <cwchar>
 #include <string>
-#include <vector>
 
 namespace Kelvra
 {
 
-bool FormatEventMessage(std::wstring& message, const wchar_t* format, va_list args)
+bool FormatEventMessage(wchar_t (&message)[kEventMessageCapacity], const wchar_t* format, va_list args)
 {
-    if (!KelvraStrings::FormatArguments(message, format, args))
+    message[0] = L'\0';
+    if (format == nullptr)
         return false;
-    if (message.size() > kMaxEventMessageLength)
-        message.resize(kMaxEventMessageLength);
+    errno = 0;
+    // -1 also reports a message cut to fit; only EINVAL says that the format was rejected.
+    if (_vsnwprintf_s(message, kEventMessageCapacity, _TRUNCATE, format, args) < 0 && errno == EINVAL)
+    {
+        message[0] = L'\0';
+        return false;
+    }
+    // Wine's runtime leaves the buffer unterminated after a %c field wider than the buffer.
+    message[kEventMessageCapacity - 1] = L'\0';
     return true;
 }
 
@@ -28,6 +36,13 @@ namespace
 const wchar_t kSourceName[] = L"KelvraSDK";
 const unsigned long kCategoryCount = 3;
 const DWORD kTypesSupported = EVENTLOG_ERROR_TYPE | EVENTLOG_WARNING_TYPE | EVENTLOG_INFORMATION_TYPE;
+
+// A source name is one key below the Application log's own: empty, it would name that key
+// itself, and a backslash would reach into another key.
+bool IsSourceName(const wchar_t* name)
+{
+    return name != nullptr && name[0] != L'\0' && std::wcschr(name, L'\\') == nullptr;
+}
 
 std::wstring SourceKeyPath(const wchar_t* name)
 {
@@ -97,7 +112,7 @@ bool COSEventLog::UnInitializeEventLog()
 
 unsigned long COSEventLog::AddEventSource(const wchar_t* name, unsigned long categoryCount)
 {
-    if (name == nullptr)
+    if (!IsSourceName(name))
         return ERROR_INVALID_PARAMETER;
     Kelvra::UniqueRegKey key;
     LONG status = ::RegCreateKeyW(HKEY_LOCAL_MACHINE, SourceKeyPath(name).c_str(), key.put());
@@ -120,7 +135,7 @@ unsigned long COSEventLog::AddEventSource(const wchar_t* name, unsigned long cat
 
 unsigned long COSEventLog::RemoveEventSource(const wchar_t* name)
 {
-    if (name == nullptr)
+    if (!IsSourceName(name))
         return ERROR_INVALID_PARAMETER;
     return static_cast<unsigned long>(::RegDeleteKeyW(HKEY_LOCAL_MACHINE, SourceKeyPath(name).c_str()));
 }
@@ -129,7 +144,7 @@ bool COSEventLog::Log(unsigned short type, unsigned short category, unsigned lon
 {
     if (m_source == nullptr)
         return false;
-    std::wstring message;
+    wchar_t message[Kelvra::kEventMessageCapacity];
     va_list args;
     va_start(args, format);
     const bool formatted = Kelvra::FormatEventMessage(message, format, args);
@@ -139,7 +154,7 @@ bool COSEventLog::Log(unsigned short type, unsigned short category, unsigned lon
     void* sid = nullptr;
     GetUserSID(&sid);
     const Kelvra::UniqueLocalMemory sidOwner(sid);
-    const wchar_t* strings[] = {message.c_str()};
+    const wchar_t* strings[] = {message};
     return ::ReportEventW(static_cast<HANDLE>(m_source), type, category, eventId, sid, 1, 0, strings, nullptr) != FALSE;
 }
 
@@ -153,25 +168,28 @@ void* COSEventLog::GetUserSID(void** sid)
     if (!::GetUserNameW(user, &userLength))
         return nullptr;
 
+    // Both buffers come from LocalAlloc, so that a shortage of memory gives null, not an
+    // exception out of Log.
     DWORD sidSize = 260;
     DWORD domainLength = 260;
     Kelvra::UniqueLocalMemory buffer(::LocalAlloc(LMEM_FIXED, sidSize));
-    std::vector<wchar_t> domain(domainLength);
+    Kelvra::UniqueLocalMemory domain(::LocalAlloc(LMEM_FIXED, domainLength * sizeof(wchar_t)));
     SID_NAME_USE use;
     for (;;)
     {
-        if (!buffer)
+        if (!buffer || !domain)
             return nullptr;
         DWORD reportedSid = sidSize;
-        DWORD reportedDomain = static_cast<DWORD>(domain.size());
-        if (::LookupAccountNameW(nullptr, user, buffer.get(), &reportedSid, domain.data(), &reportedDomain, &use))
+        DWORD reportedDomain = domainLength;
+        if (::LookupAccountNameW(nullptr, user, buffer.get(), &reportedSid,
+                                 static_cast<wchar_t*>(domain.get()), &reportedDomain, &use))
             break;
         if (::GetLastError() != ERROR_INSUFFICIENT_BUFFER)
             return nullptr;
         // Either buffer may be the short one; retry only while one of them grows, so that a
         // lookup that keeps failing cannot loop for ever.
         const bool sidGrows = reportedSid > sidSize;
-        const bool domainGrows = reportedDomain > domain.size();
+        const bool domainGrows = reportedDomain > domainLength;
         if (!sidGrows && !domainGrows)
             return nullptr;
         if (sidGrows)
@@ -180,7 +198,10 @@ void* COSEventLog::GetUserSID(void** sid)
             buffer.reset(::LocalAlloc(LMEM_FIXED, sidSize));
         }
         if (domainGrows)
-            domain.resize(reportedDomain);
+        {
+            domainLength = reportedDomain;
+            domain.reset(::LocalAlloc(LMEM_FIXED, domainLength * sizeof(wchar_t)));
+        }
     }
     if (!::IsValidSid(buffer.get()))
         return nullptr;

@@ -2,16 +2,18 @@
 #pragma once
 
 #include <cstdarg>
-#include <string>
+#include <cstddef>
 
 namespace Kelvra
 {
 
-// Longest message an entry carries, in characters; longer ones are cut.
-constexpr size_t kMaxEventMessageLength = 4095;
+// Characters an entry's message buffer holds, its terminator included: longer messages are cut
+// to one less.
+constexpr size_t kEventMessageCapacity = 4096;
 
-// Formats the message (Microsoft rules) and cuts it to kMaxEventMessageLength. False, with an
-// empty message, when the format cannot be expanded.
-bool FormatEventMessage(std::wstring& message, const wchar_t* format, va_list args);
+// Formats the message (Microsoft rules) into message, cut to fit: the work stays within the
+// buffer whatever widths the format asks for. False, with an empty message, when format is null
+// or the runtime rejects it. Allocates nothing.
+bool FormatEventMessage(wchar_t (&message)[kEventMessageCapacity], const wchar_t* format, va_list args);
 
 } // namespace Kelvra

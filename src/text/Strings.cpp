@@ -1,4 +1,5 @@
 #include "KelvraStrings.h"
+#include "text/AsciiCase.h"
 #include "text/FormatArguments.h"
 
 #include <cstdarg>
@@ -150,11 +151,7 @@ std::wstring Strings::ToString(const std::string& text)
 
 std::wstring Strings::ToLower(std::wstring& text)
 {
-    for (wchar_t& c : text)
-    {
-        if (c >= L'A' && c <= L'Z')
-            c = static_cast<wchar_t>(c + (L'a' - L'A'));
-    }
+    Kelvra::LowerAscii(text);
     return text;
 }
 

@@ -65,15 +65,16 @@ TEST(IniBadInput, NameLongerThan49CharactersMakesItsLineBadAndIsNotCut)
         const std::wstring wide(length, L'n');
         const bool fits = length <= 49;
         const wchar_t* const atCut = length == 49 ? L"v" : nullptr;
-        // A refused header leaves the section as it was.
-        ExpectIniValues("[s]\n[" + name + "]\nk = v\n",
-                        {{fits ? wide.c_str() : L"s", L"k", L"v"}, {cut.c_str(), L"k", atCut}}, fits ? 0 : 2);
-        // A refused name leaves the previous name as it was: the indented line continues "x".
-        ExpectIniValues("x =\n" + name + " = v\n  more\n",
-                        {{L"", wide.c_str(), fits ? L"v" : nullptr},
-                         {L"", cut.c_str(), atCut},
-                         {L"", L"x", fits ? nullptr : L"more"}},
-                        fits ? 0 : 2);
+        // A refused header leaves no known section: "k" is not filed under "s".
+        ExpectIniValues(
+            "[s]\n[" + name + "]\nk = v\n",
+            {{fits ? wide.c_str() : L"s", L"k", fits ? L"v" : nullptr}, {cut.c_str(), L"k", atCut}},
+            fits ? 0 : 2);
+        // A refused name ends the previous pair: the indented line does not continue "x".
+        ExpectIniValues(
+            "x =\n" + name + " = v\n  more\n",
+            {{L"", wide.c_str(), fits ? L"v" : nullptr}, {L"", cut.c_str(), atCut}, {L"", L"x", nullptr}},
+            fits ? 0 : 2);
     }
 }
 

@@ -128,15 +128,38 @@ TEST(IniParserLineEnds, CarriageReturnLineFeedEndsALineAndControlZTheFile)
 TEST(IniParserLongLines, LongLineIsKeptOnlyWhenItsContentEndsInTheFirstRead)
 {
     const std::string more(300, 'm');
+    const std::string blanks(200, ' ');
     ExpectParses({
         {"[s] ; " + more + "\nk = v ; " + more + "\n", 0, {{L"s", L"k", L"v"}}},
-        {"[" + more + "]", 1, {}},                // header closed beyond the first read
-        {std::string(250, ' ') + "a = 1", 1, {}}, // nothing but blanks in the first read
-        {"k" + more + " = 1", 1, {}},             // separator beyond the first read
+        // Beyond the first read only blanks, or blanks and an inline comment.
+        {"server = example.com" + blanks + "\n" + blanks + "\n", 0, {{L"", L"server", L"example.com"}}},
+        {"k = v" + std::string(194, ' ') + ";x\nn = 1" + blanks + " ; note\n",
+         0,
+         {{L"", L"k", L"v"}, {L"", L"n", L"1"}}},
+        {"x =\n  more" + blanks, 0, {{L"", L"x", L""}, {L"", L"x", L"more"}}},
+        {"x =\n  more" + blanks + "; note", 2, {{L"", L"x", L""}}}, // a continuation keeps its comments
+        {"k = " + std::string(195, 'v') + ";x", 1, {}},             // ";" after a letter: the value goes on
+        {"[s]\n[" + more + "]\nk = v\n", 2, {}},                    // header closed beyond the first read
+        {std::string(250, ' ') + "a = 1", 1, {}},                   // nothing but blanks in the first read
+        {"k" + more + " = 1", 1, {}},                               // separator beyond the first read
         {"x = 1\n  " + more + "\ny = 2\n", 2, {{L"", L"x", L"1"}, {L"", L"y", L"2"}}},
         // "url = " and the path fill the first read: the rest is no pair of its own.
-        {"first = 1\nurl = http://host/" + std::string(181, 'p') + "?a=b\nnext = 2\n", 2,
+        {"first = 1\nurl = http://host/" + std::string(181, 'p') + "?a=b\nnext = 2\n",
+         2,
          {{L"", L"first", L"1"}, {L"", L"next", L"2"}}},
+    });
+}
+
+TEST(IniParserLongLines, NothingAfterARefusedLineIsFiledUnderTheNamesBeforeIt)
+{
+    // A refused pair ends the previous pair; a refused header leaves no section until the next.
+    ExpectParses({
+        {"a =\nlong = " + std::string(250, 'x') + "\n  continuation\nb = 1\n",
+         2,
+         {{L"", L"a", L""}, {L"", L"b", L"1"}}},
+        {"[s]\na=1\n[" + std::string(60, 'n') + "]\nk=v\n  more\n[t]\nk=w\n",
+         3,
+         {{L"s", L"a", L"1"}, {L"t", L"k", L"w"}}},
     });
 }
 

@@ -6,7 +6,35 @@
 
 #include <sddl.h>
 
+#include <atomic>
+#include <cstdint>
+#include <cstdlib>
+#include <new>
 #include <string>
+
+namespace
+{
+// While a test lowers it, larger requests to operator new fail.
+std::atomic<std::size_t> g_allocationLimit{SIZE_MAX};
+} // namespace
+
+void* operator new(std::size_t size)
+{
+    void* block = size <= g_allocationLimit.load() ? std::malloc(size == 0 ? 1 : size) : nullptr;
+    if (block == nullptr)
+        throw std::bad_alloc();
+    return block;
+}
+
+void operator delete(void* block) noexcept
+{
+    std::free(block);
+}
+
+void operator delete(void* block, std::size_t) noexcept
+{
+    std::free(block);
+}
 
 namespace
 {
@@ -144,11 +172,19 @@ TEST_F(EventLog, RemoveEventSourceDeletesTheKeyAndReportsMissingOnes)
     EXPECT_EQ(log.RemoveEventSource(L"KelvraTest.NeverRegistered"), static_cast<unsigned long>(ERROR_FILE_NOT_FOUND));
 }
 
-TEST_F(EventLog, NullSourceNamesAreRefused)
+TEST_F(EventLog, NamesThatAreNoSourceKeyOfTheirOwnAreRefused)
 {
+    // An empty name would be the Application log's own key, a backslash would reach into another.
     COSEventLog log;
-    EXPECT_EQ(log.AddEventSource(nullptr, 3), static_cast<unsigned long>(ERROR_INVALID_PARAMETER));
-    EXPECT_EQ(log.RemoveEventSource(nullptr), static_cast<unsigned long>(ERROR_INVALID_PARAMETER));
+    for (const wchar_t* name : {static_cast<const wchar_t*>(nullptr), L"", L"KelvraTest.X\\sub", L"\\"})
+    {
+        SCOPED_TRACE(name == nullptr ? L"(null)" : name);
+        EXPECT_EQ(log.AddEventSource(name, 3), static_cast<unsigned long>(ERROR_INVALID_PARAMETER));
+        EXPECT_EQ(log.RemoveEventSource(name), static_cast<unsigned long>(ERROR_INVALID_PARAMETER));
+    }
+    EXPECT_TRUE(KeyExists(L""));
+    EXPECT_EQ(ReadValue(L"", L"EventMessageFile").status, ERROR_FILE_NOT_FOUND);
+    EXPECT_FALSE(KeyExists(L"KelvraTest.X"));
 }
 
 TEST_F(EventLog, LogNeedsAnOpenSource)
@@ -168,6 +204,16 @@ TEST_F(EventLog, LogRefusesANullFormat)
 {
     COSEventLog log;
     EXPECT_FALSE(log.Log(EVENTLOG_ERROR_TYPE, 1, 100, nullptr));
+}
+
+TEST_F(EventLog, LogFormatsWithinItsBufferAndNeverThrows)
+{
+    COSEventLog log;
+    g_allocationLimit = 64 * 1024;
+    bool logged = false;
+    EXPECT_NO_THROW(logged = log.Log(EVENTLOG_WARNING_TYPE, 1, 100, L"%1500000000d", 5));
+    g_allocationLimit = SIZE_MAX;
+    EXPECT_TRUE(logged);
 }
 
 TEST_F(EventLog, UserSidIsValidAndOwnedByTheCaller)

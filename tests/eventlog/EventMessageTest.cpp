@@ -2,15 +2,19 @@
 
 #include <gtest/gtest.h>
 
+#include <string>
+
 namespace
 {
 
 bool Format(std::wstring& message, const wchar_t* format, ...)
 {
+    wchar_t buffer[Kelvra::kEventMessageCapacity];
     va_list args;
     va_start(args, format);
-    const bool formatted = Kelvra::FormatEventMessage(message, format, args);
+    const bool formatted = Kelvra::FormatEventMessage(buffer, format, args);
     va_end(args);
+    message = buffer;
     return formatted;
 }
 
@@ -33,6 +37,12 @@ TEST(EventMessage, LongMessagesAreCutTo4095Characters)
     const std::wstring exact(4095, L'y');
     ASSERT_TRUE(Format(message, L"%s", exact.c_str()));
     EXPECT_EQ(message, exact);
+
+    // Formatted within the buffer: the whole field would take gigabytes.
+    ASSERT_TRUE(Format(message, L"%1500000000d", 5));
+    EXPECT_EQ(message, std::wstring(4095, L' '));
+    ASSERT_TRUE(Format(message, L"%-1500000000c", L'c'));
+    EXPECT_EQ(message, L'c' + std::wstring(4094, L' '));
 }
 
 TEST(EventMessage, EmptyMessageIsAMessageButANullFormatIsNot)

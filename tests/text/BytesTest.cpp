@@ -8,6 +8,9 @@
 #include <cstdlib>
 #include <new>
 #include <optional>
+#include <type_traits>
+
+static_assert(std::is_convertible_v<std::uint32_t, Bytes>, "Bytes b = 4096; compiles, as documented");
 
 // Counts the blocks this program holds through the ordinary single-object operator new, which
 // Bytes uses: a block released twice or never shows up as a wrong count.

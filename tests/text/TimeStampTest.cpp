@@ -25,6 +25,24 @@ SYSTEMTIME At(WORD year, WORD month, WORD day, WORD hour, WORD minute, WORD seco
     return time;
 }
 
+SYSTEMTIME Read(void(WINAPI* clock)(LPSYSTEMTIME))
+{
+    SYSTEMTIME time;
+    clock(&time);
+    return time;
+}
+
+// The first `length` characters of stamp() (up to its minute) must be those of clock's time, read
+// just before or just after: the minute may turn in between.
+void ExpectMinuteOf(void(WINAPI* clock)(LPSYSTEMTIME), std::wstring (*stamp)(), StampStyle style,
+                    size_t length)
+{
+    const std::wstring before = FormatTimeStamp(Read(clock), style).substr(0, length);
+    const std::wstring made = stamp().substr(0, length);
+    const std::wstring after = FormatTimeStamp(Read(clock), style).substr(0, length);
+    EXPECT_TRUE(made == before || made == after) << made << " is neither " << before << " nor " << after;
+}
+
 } // namespace
 
 TEST(TimeStamp, FormatsEachFieldAsDocumented)
@@ -49,6 +67,16 @@ TEST(TimeStamp, FormatsEachFieldAsDocumented)
         EXPECT_EQ(FormatTimeStamp(c.time, StampStyle::Readable), c.readable);
         EXPECT_EQ(FormatTimeStamp(c.time, StampStyle::Compact), c.compact);
     }
+}
+
+TEST(TimeStamp, NowIsUniversalTimeAndNowLocalIsLocalTime)
+{
+    // The test run sets TZ to a zone 5:45 away from UTC, so that clocks swapped would show.
+    const SYSTEMTIME utc = Read(::GetSystemTime), local = Read(::GetLocalTime);
+    if (utc.wHour == local.wHour && utc.wMinute == local.wMinute)
+        GTEST_SKIP() << "local time is universal time here; run with TZ=Asia/Kathmandu";
+    ExpectMinuteOf(::GetSystemTime, KelvraTime::Time::Now, StampStyle::Readable, 16);    // dd-MM-yyyy hh:mm
+    ExpectMinuteOf(::GetLocalTime, KelvraTime::Time::NowLocal, StampStyle::Compact, 12); // ddMMyyyyhhmm
 }
 
 TEST(TimeStamp, NowAndNowLocalReadTheClock)

@@ -1,6 +1,7 @@
 #include "http/pattern/RegexPattern.h"
 
 #include "http/pattern/RegexException.h"
+#include "text/AsciiCase.h"
 
 #include <algorithm>
 #include <cwchar>
@@ -13,16 +14,12 @@ using KelvraRegex::OpCode;
 namespace KelvraRegex
 {
 
-// One pass and one allocation: this copy is made once per scan of a header block, which may be
-// large, so it does not go through Strings::ToLower and its extra copy.
+// One allocation: this copy is made once per scan of a header block, which may be large, so it
+// does not go through Strings::ToLower and its extra copy. The copy takes the terminator too.
 LoweredText::LoweredText(const wchar_t* original)
-    : m_original(original), m_length(std::wcslen(original)), m_lowered(m_length + 1, L'\0')
+    : m_original(original), m_length(std::wcslen(original)), m_lowered(original, m_length + 1)
 {
-    for (size_t i = 0; i < m_length; ++i)
-    {
-        const wchar_t c = original[i];
-        m_lowered[i] = c >= L'A' && c <= L'Z' ? static_cast<wchar_t>(c - L'A' + L'a') : c;
-    }
+    Kelvra::LowerAscii(m_lowered);
 }
 
 } // namespace KelvraRegex
@@ -149,7 +146,8 @@ size_t NextCandidate(const wchar_t* text, size_t length, size_t from, wchar_t le
 } // namespace
 
 // Every read of the text checks the position against length, so nothing past the terminator is
-// read whatever the program does. The stack lives in locals while the program runs.
+// read whatever the program does. The stack lives in locals while the program runs. Each case
+// of the switch either goes on (continue), ends the run (return) or fails (goto fail).
 bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexMatchContext& context,
                         size_t& position) const
 {
@@ -163,7 +161,6 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
     size_t capacity = context.m_stack.size();
     size_t depth = 0;
     size_t pc = 0;
-    bool matched = false;
 
     // An attempt that would fail at once on its leading character is not started at all.
     size_t pos = NextCandidate(text, length, from, leading);
@@ -173,11 +170,18 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
         return false;
     }
 
+    // The stack depth and the position come by value: a capture by reference would keep them
+    // out of registers for the whole loop.
+    const auto finish = [&context, &position](size_t endDepth, size_t endPosition, bool matched)
+    {
+        context.m_depth = endDepth;
+        position = endPosition;
+        return matched;
+    };
     const auto push = [&](std::uint64_t value)
     {
         if (++depth >= capacity)
         {
-            context.m_depth = depth - 1;
             if (!context.Grow(depth))
             {
                 --depth;
@@ -211,13 +215,13 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
         case OpCode::Char:
             // Char 0 matches the terminator and steps past it.
             if (pos > length || text[pos] != static_cast<wchar_t>(operand))
-                break;
+                goto fail;
             ++pos;
             ++pc;
             continue;
         case OpCode::AnyChar:
             if (pos >= length)
-                break;
+                goto fail;
             ++pos;
             ++pc;
             continue;
@@ -225,7 +229,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
         case OpCode::NotCharClass:
         {
             if (pos >= length)
-                break;
+                goto fail;
             const std::uint64_t c = static_cast<std::uint16_t>(text[pos]);
             const size_t boundsEnd = std::min(static_cast<size_t>(operand), count);
             bool inside = false;
@@ -238,7 +242,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
                 }
             }
             if (inside != (instruction.op == OpCode::CharClass))
-                break;
+                goto fail;
             ++pos;
             pc = static_cast<size_t>(operand);
             continue;
@@ -247,21 +251,22 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             pc = static_cast<size_t>(operand);
             continue;
         case OpCode::Branch:
-            // A target whose every way fails on this character would only be tried and undone.
+            // A target whose every way fails on this character would only be tried and undone
+            // (the rule stated with the code templates in RegexProgram.cpp).
             if (pos <= length && !m_program.branchFirstChars[pc].Admits(text[pos]))
             {
                 ++pc;
                 continue;
             }
             if (!push(pc + 1))
-                goto finished;
+                return finish(depth, pos, false);
             pc = static_cast<size_t>(operand);
             continue;
         case OpCode::Backtrack:
-            break;
+            goto fail;
         case OpCode::PushPos:
             if (!push(pos))
-                goto finished;
+                return finish(depth, pos, false);
             ++pc;
             continue;
         case OpCode::PopPos:
@@ -270,7 +275,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         case OpCode::PushSlot:
             if (!push(slots[operand]))
-                goto finished;
+                return finish(depth, pos, false);
             ++pc;
             continue;
         case OpCode::PopSlot:
@@ -295,7 +300,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         case OpCode::FailIfNoProgress:
             if (pos == slots[operand])
-                break;
+                goto fail;
             ++pc;
             continue;
         case OpCode::GroupStart:
@@ -308,7 +313,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         case OpCode::PushGroup:
             if (!push(captures[operand].start) || !push(captures[operand].end))
-                goto finished;
+                return finish(depth, pos, false);
             ++pc;
             continue;
         case OpCode::PopGroup:
@@ -328,7 +333,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             while (i < n && pos + i < length && text[pos + i] == text[span.start + i])
                 ++i;
             if (i < n)
-                break;
+                goto fail;
             pos += n;
             ++pc;
             continue;
@@ -341,7 +346,7 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             if (next >= length)
             {
                 pos = length;
-                goto finished;
+                return finish(depth, pos, false);
             }
             depth = 0;
             pos = next;
@@ -349,17 +354,13 @@ bool CRegexPattern::Run(const wchar_t* text, size_t length, size_t from, CRegexM
             continue;
         }
         case OpCode::Stop:
-            goto finished;
+            return finish(depth, pos, false);
         case OpCode::Accept:
             context.m_matchEnd = pos;
-            matched = true;
-            goto finished;
+            return finish(depth, pos, true);
         }
-        // Every case that does not continue has failed: backtrack.
+    fail:
+        // Backtrack: resume at the instruction index on top of the stack.
         pc = static_cast<size_t>(pop());
     }
-finished:
-    context.m_depth = depth;
-    position = pos;
-    return matched;
 }

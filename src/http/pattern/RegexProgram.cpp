@@ -1,6 +1,7 @@
 #include "http/pattern/RegexProgram.h"
 
 #include <algorithm>
+#include <cassert>
 
 namespace KelvraRegex
 {
@@ -10,6 +11,13 @@ namespace
 
 // Emits the code templates of each construct. Indices in comments are relative to the first
 // instruction of the construct; "after" is the index just past its code.
+//
+// Every template keeps one rule, on which the matcher's first-character shortcut relies: the
+// resume point of a Branch (the instruction after it, where a failed target comes back), after
+// restoring at most captures and slots, fails, restores the position the Branch saw (PopPos,
+// RestorePos) or begins the next attempt (Advance, Stop). Going on at the resume point at once,
+// instead of trying a target that must fail on the character at hand, then ends where the try
+// would have ended. BuildProgram checks the rule in debug builds.
 class Builder
 {
 public:
@@ -228,8 +236,8 @@ void Builder::EmitLazyLoop(const Node& body)
 }
 
 // The first characters of the ways from instruction start. Instructions that move nothing are
-// followed; both ways of a Branch count, since every resume point of the templates either fails
-// or restores the position the Branch saw. Anything that can succeed, or restore a position,
+// followed; both ways of a Branch count, since by the rule of the templates its resume point
+// fails or restores the position the Branch saw. Anything that can succeed, or restore a position,
 // without consuming (Accept, a look-ahead, a back-reference) makes the answer Anything.
 FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start)
 {
@@ -304,6 +312,26 @@ FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start)
     return first;
 }
 
+// The rule of the templates (see Builder): each Branch's resume point, past PopGroup and
+// PopSlot, fails or restores the position.
+[[maybe_unused]] bool ResumePointsFailOrRestore(const std::vector<Instruction>& code)
+{
+    for (size_t at = 0; at < code.size(); ++at)
+    {
+        if (code[at].op != OpCode::Branch)
+            continue;
+        size_t resume = at + 1;
+        while (resume < code.size() &&
+               (code[resume].op == OpCode::PopGroup || code[resume].op == OpCode::PopSlot))
+            ++resume;
+        const OpCode op = resume < code.size() ? code[resume].op : OpCode::Nop;
+        if (op != OpCode::Backtrack && op != OpCode::PopPos && op != OpCode::RestorePos &&
+            op != OpCode::Advance && op != OpCode::Stop)
+            return false;
+    }
+    return true;
+}
+
 } // namespace
 
 FirstChars FirstChars::Anything()
@@ -347,6 +375,7 @@ Program BuildProgram(const SyntaxTree& tree)
     program.code.push_back(Instruction{tree.anchored ? OpCode::Stop : OpCode::Advance, 0});
     builder.Emit(*tree.root);
     program.code.push_back(Instruction{OpCode::Accept, 0});
+    assert(ResumePointsFailOrRestore(program.code));
     if (!tree.anchored && program.code[2].op == OpCode::Char)
         program.leadingChar = static_cast<wchar_t>(program.code[2].operand);
     // A way that fails can still leave a capture end behind (GroupEnd is undone only when the

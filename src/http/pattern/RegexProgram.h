@@ -49,7 +49,8 @@ struct Instruction
 
 // The characters with which a way through the program from some instruction can begin, when
 // every such way must consume one before it can succeed. The matcher skips a choice whose ways
-// all fail on the character at hand: that changes nothing it reports, only the work.
+// all fail on the character at hand: by the rule the code templates keep (RegexProgram.cpp),
+// that changes nothing it reports, only the work.
 class FirstChars
 {
 public:

@@ -1,6 +1,6 @@
 #include "http/pattern/RegexSyntax.h"
 
-#include "KelvraStrings.h"
+#include "text/AsciiCase.h"
 
 #include <string>
 
@@ -354,7 +354,7 @@ int ParseRegex(const wchar_t* pattern, SyntaxTree& tree)
 {
     tree = SyntaxTree();
     std::wstring lowered = pattern != nullptr ? pattern : L"";
-    KelvraStrings::Strings::ToLower(lowered);
+    Kelvra::LowerAscii(lowered);
     const wchar_t* text = lowered.c_str();
     if (text[0] == L'^')
     {
