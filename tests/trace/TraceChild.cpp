@@ -62,9 +62,13 @@ void StartWhileAnotherThreadTraces(const std::string& name)
     std::thread emitter(
         [&]
         {
-            // Goes on for a while once the session is open, so that its lines cross the start.
-            for (int after = 0; after < 100; after += started ? 1 : 0)
+            // Goes on for 100 lines emitted once start returned, so that the lines cross it.
+            for (int after = 0; after < 100;)
+            {
+                const bool open = started;
                 KELVRA_TRC(L"host race %d", emitted++);
+                after += open ? 1 : 0;
+            }
         });
     while (emitted == 0)
         ::Sleep(0);
