@@ -74,7 +74,8 @@ public:
     // the library unloads avoids the exit notice on the debugger output.
     static void stop();
     // Take and release the trace lock (recursive, no time-out), for a host that wants several
-    // lines together. Pair them on the same thread.
+    // lines together or changes the trace state. While a host holds it, lines of other threads
+    // wait for it, dropped ones included. Pair them on the same thread.
     static void lock();
     static void unlock();
 
