@@ -40,12 +40,7 @@ protected:
         ASSERT_NE(CLog::_log, nullptr);
     }
 
-    void TearDown() override
-    {
-        Debug::_modules = nullptr;
-        Debug::_lvl = Debug::lvlDebug;
-        Detach();
-    }
+    void TearDown() override { Detach(); }
 
     // Ends the scratch session and returns what it wrote.
     std::string Written()
@@ -124,6 +119,7 @@ TEST_F(TraceEmission, LinesFollowTheHostsOwnChangesOfListAndLevel)
     KELVRA_INF(L"at the level");
     Debug::_lvl = Debug::lvlDebug;
     KELVRA_TRC(L"below it again");
+    Debug::_modules = nullptr;
     EXPECT_EQ(TaggedMessages(Written()),
               (Lines{"TRC no list", "TRC a new list names this program", "TRC named again in place",
                      "INF at the level", "TRC below it again"}));
