@@ -1,7 +1,9 @@
 // Trace lines per second with a session open and no filter, for 1 and 4 threads, beside a raw
 // loop doing the same work without the library in the same run: the same kind of mutex wait,
 // time stamp, seek, Microsoft-rules wide formatted write and flush on the same kind of file. Also
-// the cost of one line while no session is open.
+// the cost of a line that is dropped (no session open, a level above the line's, a module the
+// filter leaves out) beside a bare mutex wait and release, and how dropped lines scale over
+// 4 threads.
 //
 // The measurements run in a child process (the session lasts as long as its process), so that
 // the parent can remove the log files and the marker directory afterwards.
@@ -30,7 +32,9 @@ const wchar_t kMarker[] = L"c:\\keltrace";
 const wchar_t kRawLog[] = L"c:\\keltrace\\trace_bench_raw.log";
 const int kRuns = 5;
 const int kLines = 20000;
-const int kIdleLines = 100000;
+const int kMutexRounds = 20000;
+const int kDroppedLines = 10000000;
+const int kDroppedRuns = 20;
 
 struct RawLog
 {
@@ -57,36 +61,41 @@ void TraceLine(int value)
     KELVRA_TRC(L"bench line %d", value);
 }
 
-// kLines lines spread over `threads` threads.
-template <typename Line> void WriteLines(int threads, Line& line)
+void InfoLine(int value)
+{
+    KELVRA_INF(L"bench line %d", value);
+}
+
+// `lines` lines spread over `threads` threads.
+template <typename Line> void EmitLines(int threads, int lines, Line& line)
 {
     std::vector<std::thread> workers;
     for (int t = 0; t < threads; ++t)
         workers.emplace_back(
-            [&line, threads]
+            [&line, threads, lines]
             {
-                for (int i = 0; i < kLines / threads; ++i)
+                for (int i = 0; i < lines / threads; ++i)
                     line(i);
             });
     for (std::thread& worker : workers)
         worker.join();
 }
 
+void PrintRow(const char* name, int lines, double seconds)
+{
+    std::printf("  %-44s %12.0f %12.1f\n", name, lines / seconds, 1e9 * seconds / lines);
+}
+
 int Measure()
 {
-    // With no session a line only takes and releases the trace lock: compare with a bare wait and
-    // release of a mutex.
+    // The reference for dropped lines: what taking and releasing the trace lock would cost them.
     HANDLE bare = ::CreateMutexW(nullptr, FALSE, nullptr);
+    auto idleLine = [](int value) { TraceLine(value); };
     const auto [idleSeconds, bareSeconds] = BestSecondsInTurn(
-        kRuns,
-        []
-        {
-            for (int i = 0; i < kIdleLines; ++i)
-                TraceLine(i);
-        },
+        kRuns, [&] { EmitLines(1, kDroppedLines, idleLine); },
         [bare]
         {
-            for (int i = 0; i < kIdleLines; ++i)
+            for (int i = 0; i < kMutexRounds; ++i)
             {
                 ::WaitForSingleObject(bare, INFINITE);
                 ::ReleaseMutex(bare);
@@ -106,30 +115,52 @@ int Measure()
     auto rawLine = [&raw](int value) { RawLine(raw, value); };
 
     auto traceLine = [](int value) { TraceLine(value); };
-    const auto [trace1Seconds, raw1Seconds] =
-        BestSecondsInTurn(kRuns, [&] { WriteLines(1, traceLine); }, [&] { WriteLines(1, rawLine); });
-    const auto [trace4Seconds, raw4Seconds] =
-        BestSecondsInTurn(kRuns, [&] { WriteLines(4, traceLine); }, [&] { WriteLines(4, rawLine); });
-    const double trace1 = kLines / trace1Seconds, raw1 = kLines / raw1Seconds;
-    const double trace4 = kLines / trace4Seconds, raw4 = kLines / raw4Seconds;
+    const auto [trace1Seconds, raw1Seconds] = BestSecondsInTurn(
+        kRuns, [&] { EmitLines(1, kLines, traceLine); }, [&] { EmitLines(1, kLines, rawLine); });
+    const auto [trace4Seconds, raw4Seconds] = BestSecondsInTurn(
+        kRuns, [&] { EmitLines(4, kLines, traceLine); }, [&] { EmitLines(4, kLines, rawLine); });
     std::fclose(raw.file);
     ::CloseHandle(raw.mutex);
     ::_wremove(kRawLog);
 
-    std::printf("Trace lines, %d lines a run, best of %d runs\n", kLines, kRuns);
-    std::printf("  %-34s %12s %12s\n", "case", "lines/s", "us/line");
-    std::printf("  %-34s %12.0f %12.2f\n", "Kelvra, 1 thread", trace1, 1e6 / trace1);
-    std::printf("  %-34s %12.0f %12.2f\n", "raw loop, 1 thread", raw1, 1e6 / raw1);
-    std::printf("  %-34s %12.0f %12.2f\n", "Kelvra, 4 threads", trace4, 1e6 / trace4);
-    std::printf("  %-34s %12.0f %12.2f\n", "raw loop, 4 threads", raw4, 1e6 / raw4);
-    std::printf("  %-34s %12.0f %12.2f\n", "Kelvra, no session open", kIdleLines / idleSeconds,
-                1e6 * idleSeconds / kIdleLines);
-    std::printf("  %-34s %12.0f %12.2f\n", "bare mutex wait and release", kIdleLines / bareSeconds,
-                1e6 * bareSeconds / kIdleLines);
+    // A host's own settings, changed under the trace lock: level info drops "[TRC]" lines, and a
+    // list naming another module drops this program's "[INF]" lines.
+    Debug::lock();
+    Debug::_lvl = Debug::lvlInfo;
+    Debug::_modules->push_back(L"another.module");
+    Debug::unlock();
+    auto levelDropped = [](int value) { TraceLine(value); };
+    auto filterDropped = [](int value) { InfoLine(value); };
+    const auto [levelSeconds, filter1Seconds, filter4Seconds] = BestSecondsInTurn(
+        kDroppedRuns, [&] { EmitLines(1, kDroppedLines, levelDropped); },
+        [&] { EmitLines(1, kDroppedLines, filterDropped); },
+        [&] { EmitLines(4, kDroppedLines, filterDropped); });
+
+    std::printf("Trace lines: %d written a round, best of %d rounds; %d dropped a round, best of %d rounds "
+                "(%d with no session)\n",
+                kLines, kRuns, kDroppedLines, kDroppedRuns, kRuns);
+    std::printf("  %-44s %12s %12s\n", "case", "lines/s", "ns/line");
+    PrintRow("Kelvra written, 1 thread", kLines, trace1Seconds);
+    PrintRow("raw loop, 1 thread", kLines, raw1Seconds);
+    PrintRow("Kelvra written, 4 threads", kLines, trace4Seconds);
+    PrintRow("raw loop, 4 threads", kLines, raw4Seconds);
+    PrintRow("Kelvra dropped, no session open", kDroppedLines, idleSeconds);
+    PrintRow("Kelvra dropped by the level", kDroppedLines, levelSeconds);
+    PrintRow("Kelvra dropped by the module filter", kDroppedLines, filter1Seconds);
+    PrintRow("Kelvra dropped by the module filter, 4 threads", kDroppedLines, filter4Seconds);
+    PrintRow("bare mutex wait and release", kMutexRounds, bareSeconds);
     std::printf("Ratios\n");
+    const double mutexRound = bareSeconds / kMutexRounds;
     bool met = true;
-    met &= ReportTarget("1 thread: Kelvra / raw loop", trace1 / raw1, ">=", 0.8);
-    met &= ReportTarget("4 threads: Kelvra / raw loop", trace4 / raw4, ">=", 0.8);
+    met &= ReportTarget("written, 1 thread: Kelvra / raw loop", raw1Seconds / trace1Seconds, ">=", 0.8);
+    met &= ReportTarget("written, 4 threads: Kelvra / raw loop", raw4Seconds / trace4Seconds, ">=", 0.8);
+    met &= ReportTarget("no session: times faster than the mutex", mutexRound * kDroppedLines / idleSeconds,
+                        ">=", 50);
+    met &= ReportTarget("level: times faster than the mutex", mutexRound * kDroppedLines / levelSeconds,
+                        ">=", 50);
+    met &= ReportTarget("module filter: times faster than the mutex",
+                        mutexRound * kDroppedLines / filter1Seconds, ">=", 50);
+    met &= ReportTarget("module filter: 4 threads / 1 thread", filter1Seconds / filter4Seconds, ">=", 1.5);
     return met ? 0 : 1;
 }
 

@@ -46,7 +46,9 @@ public:
     Debug();
     Debug& operator=(const Debug& other);
 
-    // Process-wide trace state. Read it under the trace lock (lock / unlock).
+    // Process-wide trace state. Read and change it under the trace lock (lock / unlock): a
+    // host may set _lvl or _modules, or change the names in the list, and lines follow from
+    // unlock on. Emitting threads also read _lvl, _modules and CLog::_log without the lock.
     // _lvl only rises (configuration); 0 at load.
     static Levels _lvl;
     // Lower-cased module names allowed to trace, in file order, duplicates kept; null or empty
@@ -73,7 +75,8 @@ public:
     // the library unloads avoids the exit notice on the debugger output.
     static void stop();
     // Take and release the trace lock (recursive, no time-out), for a host that wants several
-    // lines together. Pair them on the same thread.
+    // lines together or changes the trace state. While a host holds it, lines of other threads
+    // wait for it, dropped ones included. Pair them on the same thread.
     static void lock();
     static void unlock();
 
@@ -94,11 +97,14 @@ public:
     // The emission sequence behind the macros below; call the macros rather than these.
     // Under the trace lock, with a session open: reads the configuration once, checks the level
     // against threshold and the filter against the name of the module whose image starts at
-    // moduleBase, then appends "<tag>[<now>][<file>:<line>] <message>\n" to the log file and
-    // flushes it. message is formatted with Microsoft rules whatever the caller's compiler
-    // settings: %s takes a wide string, %hs a narrow one, %d an int. Characters the C runtime's
-    // current locale cannot write become '?'. Never throws, and leaves the calling thread's
-    // last-error code and errno as they were. Null texts count as empty.
+    // moduleBase (a loaded image, or null for the executable), then appends
+    // "<tag>[<now>][<file>:<line>] <message>\n" to the log file and flushes it. A line dropped
+    // for want of a session, by the level, or by the filter's answer already known for its
+    // module costs a few reads and no lock. message is formatted with Microsoft rules whatever
+    // the caller's compiler settings: %s takes a wide string, %hs a narrow one, %d an int.
+    // Characters the C runtime's current locale cannot write become '?'. Never throws, and
+    // leaves the calling thread's last-error code and errno as they were. Null texts count as
+    // empty.
     static void emit(const void* moduleBase, Levels threshold, const wchar_t* tag, const wchar_t* file,
                      int line, const wchar_t* message, ...) noexcept;
     static void emitV(const void* moduleBase, Levels threshold, const wchar_t* tag, const wchar_t* file,

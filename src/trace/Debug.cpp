@@ -3,6 +3,8 @@
 #include "KelvraStrings.h"
 
 #include "common/UniqueHandle.h"
+#include "trace/ModuleFilterCache.h"
+#include "trace/SharedField.h"
 #include "trace/TraceConfig.h"
 #include "trace/TraceLine.h"
 #include "trace/TraceNames.h"
@@ -12,11 +14,15 @@
 #include <process.h>
 #include <share.h>
 
+#include <atomic>
 #include <cerrno>
 #include <mutex>
 #include <stdexcept>
 
 using KelvraStrings::Strings;
+using KelvraTrace::LoadAcquire;
+using KelvraTrace::ModuleFilterCache;
+using KelvraTrace::StoreRelease;
 
 Debug::Levels Debug::_lvl = Debug::lvlDebug;
 std::vector<std::wstring>* Debug::_modules = nullptr;
@@ -29,6 +35,20 @@ namespace
 bool configured = false; // Debug::configure has read the file (or is reading it)
 bool stopped = false;    // Debug::stop has run: names read later start no new list
 
+// Constant-initialised, so that lines emitted while the library's statics are being built find it.
+ModuleFilterCache filterAnswers;
+// Debug::lock calls not yet matched by Debug::unlock. While a host holds the trace lock it may be
+// changing the state, so every line waits for the lock as it always did.
+std::atomic<int> hostLocks{0};
+
+// Whoever changed the list or the level under the trace lock (this library, or a host between
+// Debug::lock and Debug::unlock) makes the module filter's answers follow before letting go.
+void ReleaseTraceLock()
+{
+    filterAnswers.Sync(Debug::_modules, Debug::_lvl);
+    ::ReleaseMutex(CLog::_mutex);
+}
+
 // Holds the trace lock for one scope. A wait that fails (no mutex) goes on unlocked rather than
 // losing the caller's line; an abandoned mutex is ours all the same.
 class TraceLock
@@ -38,7 +58,7 @@ public:
     ~TraceLock()
     {
         if (m_held)
-            ::ReleaseMutex(CLog::_mutex);
+            ReleaseTraceLock();
     }
     TraceLock(const TraceLock&) = delete;
     TraceLock& operator=(const TraceLock&) = delete;
@@ -66,6 +86,34 @@ void WriteText(std::FILE* file, const std::wstring& text)
     std::fseek(file, 0, SEEK_END);
     std::fwrite(bytes.data(), 1, bytes.size(), file);
     std::fflush(file);
+}
+
+// What the state already decides, read without the trace lock: no session, a level above the
+// line's, or the module filter's known answer for the caller.
+bool IsDroppedBeforeLock(const KelvraTrace::ModuleKey& caller, Debug::Levels threshold) noexcept
+{
+    if (hostLocks.load(std::memory_order_acquire) != 0)
+        return false;
+    if (LoadAcquire(CLog::_log) == nullptr)
+        return true;
+    const Debug::Levels level = LoadAcquire(Debug::_lvl);
+    return level > threshold || filterAnswers.Find(caller, LoadAcquire(Debug::_modules), level) ==
+                                    ModuleFilterCache::Answer::Dropped;
+}
+
+// The module filter for the module whose image starts at moduleBase, asked of the platform once
+// per module and filter state.
+bool IsTracedUnderLock(const void* moduleBase, const KelvraTrace::ModuleKey& caller)
+{
+    filterAnswers.Sync(Debug::_modules, Debug::_lvl);
+    const ModuleFilterCache::Answer known = filterAnswers.Find(caller, Debug::_modules, Debug::_lvl);
+    if (known != ModuleFilterCache::Answer::Unknown)
+        return known == ModuleFilterCache::Answer::Traced;
+    const HMODULE module = static_cast<HMODULE>(const_cast<void*>(moduleBase));
+    const bool traced =
+        KelvraTrace::IsModuleTraced(Debug::_modules, Debug::module(KelvraTrace::ModuleFilePath(module)));
+    filterAnswers.Store(caller, traced);
+    return traced;
 }
 
 } // namespace
@@ -133,13 +181,13 @@ bool Debug::config()
         return true;
     const KelvraTrace::TraceConfig read = KelvraTrace::ParseTraceConfig(content);
     if (read.level > _lvl)
-        _lvl = static_cast<Levels>(read.level);
+        StoreRelease(_lvl, static_cast<Levels>(read.level));
     if (read.modules.empty())
         return true;
     // Without a list the names would be lost for the life of the process (the file is read
     // once), unless stop asked for every module to trace.
     if (_modules == nullptr && !stopped)
-        _modules = new std::vector<std::wstring>();
+        StoreRelease(_modules, new std::vector<std::wstring>());
     if (_modules != nullptr)
         _modules->insert(_modules->end(), read.modules.begin(), read.modules.end());
     return true;
@@ -173,6 +221,12 @@ void Debug::emit(const void* moduleBase, Levels threshold, const wchar_t* tag, c
 void Debug::emitV(const void* moduleBase, Levels threshold, const wchar_t* tag, const wchar_t* file, int line,
                   const wchar_t* message, va_list args) noexcept
 {
+    // Most lines are dropped, at the cost of a few reads that leave the error codes alone. A line
+    // racing a change of state may go either way.
+    const KelvraTrace::ModuleKey caller = KelvraTrace::KeyOfModule(moduleBase);
+    if (IsDroppedBeforeLock(caller, threshold))
+        return;
+
     // Callers trace on their failure paths before reading the error codes.
     const DWORD lastError = ::GetLastError();
     const int lastErrno = errno;
@@ -185,13 +239,8 @@ void Debug::emitV(const void* moduleBase, Levels threshold, const wchar_t* tag, 
                 // Checked here first so that a line costs no second trip through the lock.
                 if (!configured)
                     configure();
-                if (_lvl <= threshold)
-                {
-                    HMODULE caller = static_cast<HMODULE>(const_cast<void*>(moduleBase));
-                    if (KelvraTrace::IsModuleTraced(_modules, module(KelvraTrace::ModuleFilePath(caller))))
-                        WriteText(CLog::_log,
-                                  KelvraTrace::BuildTraceLine(tag, now(), file, line, message, args));
-                }
+                if (_lvl <= threshold && IsTracedUnderLock(moduleBase, caller))
+                    WriteText(CLog::_log, KelvraTrace::BuildTraceLine(tag, now(), file, line, message, args));
             }
         }
         catch (...)
@@ -216,17 +265,19 @@ void Debug::stop()
     TraceLock lock;
     stopped = true;
     delete _modules;
-    _modules = nullptr;
+    StoreRelease(_modules, static_cast<std::vector<std::wstring>*>(nullptr));
 }
 
 void Debug::lock()
 {
     ::WaitForSingleObject(CLog::_mutex, INFINITE);
+    hostLocks.fetch_add(1);
 }
 
 void Debug::unlock()
 {
-    ::ReleaseMutex(CLog::_mutex);
+    hostLocks.fetch_sub(1);
+    ReleaseTraceLock();
 }
 
 bool Debug::log()
@@ -244,7 +295,7 @@ void Debug::setFile(const std::wstring& path, bool append)
 {
     TraceLock lock;
     if (_modules == nullptr)
-        _modules = new std::vector<std::wstring>();
+        StoreRelease(_modules, new std::vector<std::wstring>());
     if (CLog::_log != nullptr)
         return;
     // Appending writers share the file; a session that empties it keeps other writers out.
@@ -254,7 +305,7 @@ void Debug::setFile(const std::wstring& path, bool append)
     // A process-name failure throws from here and closes the file on the way out.
     WriteText(file.get(),
               Strings::Format(L"\n\n*****     NEW LOG SESSION [%s]     *****\n\n", process().c_str()));
-    CLog::_log = file.release();
+    StoreRelease(CLog::_log, file.release());
 }
 
 std::wstring Debug::autoName(const std::wstring& name)

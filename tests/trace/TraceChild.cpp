@@ -3,6 +3,8 @@
 // in order; steps that have a result report one line "<step>:<result>" on standard output.
 //   out:<file>                                   standard output goes to this file (the first step)
 //   start:<name>:<append 0|1>:<perProcess 0|1>   Debug::start, prints "ok" or the exception text
+//   race:<name>                                  start:<name>:1:0 while another thread emits lines
+//                                                "host race <n>", n from 0; prints how many
 //   stop | configure                             Debug::stop / Debug::configure
 //   trc:<text> | inf:<text> | err:<text>         a line of this module: "host <text>"
 //   sample-trc:<text> | sample-inf:... | sample-err:...   a line of Sample.Net.dll: "sample <text>"
@@ -18,11 +20,13 @@
 
 #include <share.h>
 
+#include <atomic>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <stdexcept>
 #include <string>
+#include <thread>
 
 extern "C" __declspec(dllimport) void SampleTrace(char level, const wchar_t* text);
 
@@ -51,6 +55,29 @@ void Start(const std::string& arguments)
     }
 }
 
+void StartWhileAnotherThreadTraces(const std::string& name)
+{
+    std::atomic<int> emitted(0);
+    std::atomic<bool> started(false);
+    std::thread emitter(
+        [&]
+        {
+            // Goes on for 100 lines emitted once start returned, so that the lines cross it.
+            for (int after = 0; after < 100;)
+            {
+                const bool open = started;
+                KELVRA_TRC(L"host race %d", emitted++);
+                after += open ? 1 : 0;
+            }
+        });
+    while (emitted == 0)
+        ::Sleep(0);
+    Start(name + ":1:0");
+    started = true;
+    emitter.join();
+    Report("race", std::to_string(emitted));
+}
+
 bool RunStep(const std::string& step)
 {
     const size_t colon = step.find(':');
@@ -61,6 +88,8 @@ bool RunStep(const std::string& step)
         return ::_wfreopen(text.c_str(), L"w", stdout) != nullptr;
     else if (verb == "start")
         Start(argument);
+    else if (verb == "race")
+        StartWhileAnotherThreadTraces(argument);
     else if (verb == "stop")
         Debug::stop();
     else if (verb == "configure")

@@ -97,6 +97,34 @@ TEST_F(TraceEmission, KeepsTheCallersErrorCodes)
     EXPECT_EQ(TaggedMessages(Written()), Lines{"ERR between failing and reading the error"});
 }
 
+TEST_F(TraceEmission, LinesFollowTheHostsOwnChangesOfListAndLevel)
+{
+    // Each change comes after an answer for this program was kept for the state before it.
+    std::vector<std::wstring> other = {L"another"}, mine = {L"trace_tests"};
+    KELVRA_TRC(L"no list");
+    Debug::_modules = &other;
+    KELVRA_TRC(L"dropped: the list names another module");
+    Debug::_modules = &mine;
+    KELVRA_TRC(L"a new list names this program");
+    Debug::lock();
+    mine[0] = L"another";
+    Debug::unlock();
+    KELVRA_TRC(L"dropped: the list no longer names it");
+    Debug::lock();
+    mine[0] = L"trace_tests";
+    Debug::unlock();
+    KELVRA_TRC(L"named again in place");
+    Debug::_lvl = Debug::lvlInfo;
+    KELVRA_TRC(L"dropped by the level");
+    KELVRA_INF(L"at the level");
+    Debug::_lvl = Debug::lvlDebug;
+    KELVRA_TRC(L"below it again");
+    Debug::_modules = nullptr;
+    EXPECT_EQ(TaggedMessages(Written()),
+              (Lines{"TRC no list", "TRC a new list names this program", "TRC named again in place",
+                     "INF at the level", "TRC below it again"}));
+}
+
 TEST_F(TraceEmission, ThreadsNeverInterleaveNorLoseLines)
 {
     const int threads = 8, linesEach = 10000;

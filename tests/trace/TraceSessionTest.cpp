@@ -7,6 +7,7 @@
 #include "common/UniqueHandle.h"
 
 #include <algorithm>
+#include <cstring>
 #include <future>
 #include <tuple>
 
@@ -103,6 +104,18 @@ TEST_F(TraceSession, ProcessNameFailuresThrowAndCloseTheFileAtOnce)
     EXPECT_EQ(MarkerFiles(), (std::vector<std::wstring>{L"dotonly.log", L"nodot.log"}));
 }
 
+TEST_F(TraceSession, LinesRacingTheStartAreWholeOrAbsent)
+{
+    const ChildResult run = RunChild({"race:net"});
+    ASSERT_EQ(run.output.size(), 2u);
+    const size_t emitted = std::stoul(run.output[1].substr(std::strlen("race:")));
+    // From some line on, every line whole and in order, up to the last one.
+    const Lines lines = SessionLines(ReadMarkerFile(L"net.log"));
+    ASSERT_GE(lines.size(), 100u);
+    for (size_t i = 0; i < lines.size(); ++i)
+        EXPECT_EQ(lines[i], "TRC host race " + std::to_string(emitted - lines.size() + i));
+}
+
 TEST_F(TraceSession, ExitNoticeOnceWhenTheHostNeverStopped)
 {
     const Lines notices = RunChild({"start:net:1:0", "trc:some line"}, true).debugStrings;
@@ -149,6 +162,14 @@ TEST_F(TraceConfigured, NamedModuleAloneTracesUntilStop)
               "trc:after", "sample-inf:after"});
     EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")),
               (Lines{"INF sample before", "INF host after", "INF sample after"}));
+}
+
+TEST_F(TraceConfigured, SecondStartAfterStopLetsEveryModuleTrace)
+{
+    // What was known under the first list (this program's lines dropped) holds no more.
+    WriteMarkerFile(L"debug", "Sample.Net\n");
+    RunChild({"start:net:1:0", "trc:dropped", "stop", "start:net:1:0", "trc:after the second start"});
+    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")), Lines{"TRC host after the second start"});
 }
 
 TEST_F(TraceConfigured, ReadBeforeTheSessionStartsTheFilterStillHolds)

@@ -136,7 +136,7 @@ ChildResult RunChild(const Lines& steps, bool debugged, const std::wstring& prog
         return result;
     }
     const Kelvra::UniqueProcess process(started.hProcess);
-    ::CloseHandle(started.hThread);
+    const Kelvra::UniqueThread thread(started.hThread);
     result.processId = started.dwProcessId;
     if (debugged)
         DebugUntilExit(process.get(), result.debugStrings);
