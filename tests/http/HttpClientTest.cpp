@@ -1,0 +1,275 @@
+// CWinHttpClient against the local HTTP and HTTPS servers (tests/support/http_server.py), with the
+// trace it writes read back from the real log file.
+#include "HttpTestSupport.h"
+
+#include "KelvraHttp.h"
+#include "KelvraTrace.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <filesystem>
+
+using KelvraHttpTest::NewTraceLines;
+using KelvraHttpTest::ServerUrl;
+using Lines = std::vector<std::wstring>;
+
+namespace
+{
+
+// A trace session for the whole program, in c:\keltrace, which is left as it was found.
+class TraceSession : public testing::Environment
+{
+    void SetUp() override
+    {
+        m_created = std::filesystem::create_directory(L"c:\\keltrace");
+        Debug::start(L"http_tests", false, false);
+        ASSERT_NE(CLog::_log, nullptr) << "no trace session in c:\\keltrace";
+    }
+    void TearDown() override
+    {
+        Debug::stop();
+        Debug::lock();
+        std::fclose(CLog::_log);
+        CLog::_log = nullptr;
+        Debug::unlock();
+        std::filesystem::remove(L"c:\\keltrace\\http_tests.log");
+        if (m_created)
+            std::filesystem::remove(L"c:\\keltrace");
+    }
+    bool m_created = false;
+};
+testing::Environment* const traceSession = testing::AddGlobalTestEnvironment(new TraceSession);
+
+std::vector<double> progressReports;
+
+bool RecordProgress(double percent)
+{
+    progressReports.push_back(percent);
+    return false;
+}
+
+} // namespace
+
+// One fresh client per row, with the extra header "X-One: 1" and the cookies "a=1; b=2"; a POST
+// carries the body "k=v". The row's setup runs first, then its before path is fetched the row's
+// way, then its path. A path starting with "/" is on the HTTP server, "https:" on the HTTPS one.
+// The summary: "<result> <last error> (<error of the last failed send, as traced>) <status>
+// [<charset>] <received>/<announced> <location> {<cookies>} <content>".
+TEST(HttpExchanges, ResultsAsTheClientShowsThem)
+{
+    struct Row
+    {
+        const char* name;
+        void (*setup)(CWinHttpClient&);
+        std::wstring before, path;
+        const wchar_t* method;
+        bool redirectOff;
+        std::wstring expected;
+    };
+    const std::wstring echoed = L"X-One: 1\nCookie: a=1; b=2\nUser-Agent: WinHttpClient\n";
+    const std::wstring type = L"/respond?header=Content-Type:%20text/plain;%20charset=";
+    const std::wstring moved = L"/respond?status=302&header=Location:%20/respond%3Fbody%3Dmoved";
+    const Row rows[] = {
+        {"GetEcho", nullptr, L"", L"/echo", L"GET", false,
+         L"true 0 () 200 [] 57/57 <> {} GET\n" + echoed + L"\n"},
+        {"PostEcho", nullptr, L"", L"/echo", L"POST", false,
+         L"true 0 () 200 [] 79/79 <> {} POST\n" + echoed + L"Content-Length: 3\n\nk=v"},
+        {"LowerCaseGet", nullptr, L"", L"/echo", L"get", false,
+         L"true 0 () 200 [] 57/57 <> {} GET\n" + echoed + L"\n"},
+        {"MixedCaseGet", nullptr, L"", L"/echo", L"Get", false,
+         L"true 0 () 200 [] 57/57 <> {} GET\n" + echoed + L"\n"},
+        {"NotFoundIsAResponse", nullptr, L"", L"/respond?status=404&body=missing", L"GET", false,
+         L"true 0 () 404 [] 7/7 <> {} missing"},
+        {"ChunkedKeepsEarlierLength", nullptr, L"/respond?body=12345", L"/respond?chunked=1&body=abcdefg",
+         L"GET", false, L"true 0 () 200 [] 7/5 <> {} abcdefg"},
+        {"ZeroByteEndsText", nullptr, L"", L"/respond?body=ab%00cd", L"GET", false,
+         L"true 0 () 200 [] 5/5 <> {} ab"},
+        {"EmptyBody", nullptr, L"", L"/respond", L"GET", false, L"true 0 () 200 [] 0/0 <> {} "},
+        {"ShortOfAnnouncedLength", nullptr, L"", L"/respond?header=Content-Length:%201000&body=short", L"GET",
+         false, L"true 0 () 200 [] 5/1000 <> {} short"},
+        {"Utf8", nullptr, L"", type + L"UTF-8&body=%C3%A9t%C3%A9", L"GET", false,
+         L"true 0 () 200 [UTF-8] 5/5 <> {} \u00e9t\u00e9"},
+        {"Latin1ThroughAnsiCodePage", nullptr, L"", type + L"ISO-8859-1&body=%E9t%E9", L"GET", false,
+         L"true 0 () 200 [ISO-8859-1] 3/3 <> {} \u00e9t\u00e9"},
+        {"NoCharsetKeepsEarlierOne", nullptr, type + L"UTF-8", L"/respond?body=%C3%A9", L"GET", false,
+         L"true 0 () 200 [UTF-8] 2/2 <> {} \u00e9"},
+        {"ForcedCharsetWins", [](CWinHttpClient& client) { client.SetForceCharset(L"utf-8"); }, L"",
+         type + L"ISO-8859-1&body=%C3%A9", L"GET", false, L"true 0 () 200 [utf-8] 2/2 <> {} \u00e9"},
+        {"CookiesAccumulate", nullptr,
+         L"/respond?header=Set-Cookie:%20a=1;%20Path=/&header=Set-Cookie:%20b=2",
+         L"/respond?header=Set-Cookie:%20c=3", L"GET", false,
+         L"true 0 () 200 [] 0/0 <> {a=1; Path=/; b=2;c=3;} "},
+        {"CutHtmlGetSentFiveTimes", nullptr, L"/respond?key=get&body=%3CHTML%3Ecut", L"/count?key=get",
+         L"GET", false, L"true 0 () 200 [] 1/1 <> {} 5"},
+        {"CutHtmlPostSentOnce", nullptr, L"/respond?key=post&body=%3Chtml%3Ecut", L"/count?key=post", L"POST",
+         false, L"true 0 () 200 [] 1/1 <> {} 1"},
+        {"CutHtmlWithoutRedirectsSentOnce", nullptr, L"/respond?key=direct&body=%3Chtml%3Ecut",
+         L"/count?key=direct", L"GET", true, L"true 0 () 200 [] 1/1 <> {} 1"},
+        {"RedirectFollowed", nullptr, L"", moved, L"GET", false, L"true 0 () 200 [] 5/5 <> {} moved"},
+        {"RedirectReturned", nullptr, L"", moved, L"GET", true,
+         L"true 0 () 302 [] 0/0 </respond?body=moved> {} "},
+        {"ContentLocationIsNoLocation", nullptr, L"",
+         L"/respond?status=201&header=Content-Location:%20/other&header=Location:%20/made", L"GET", true,
+         L"true 0 () 201 [] 0/0 </made> {} "},
+        {"RefusedPort", nullptr, L"", L"http://127.0.0.1:1/", L"GET", false,
+         L"false 0 (12029)  [] 0/0 <> {} "},
+        {"PathTooLongForItsBuffer", nullptr, L"", L"/" + std::wstring(1500, L'p'), L"GET", false,
+         L"false 122 ()  [] 0/0 <> {} "},
+        {"SelfSignedAccepted", nullptr, L"", L"https:/respond?body=secure", L"GET", false,
+         L"true 0 () 200 [] 6/6 <> {} secure"},
+        {"SelfSignedRefusedWhenRequired",
+         [](CWinHttpClient& client) { client.SetRequireValidSslCertificates(true); }, L"",
+         L"https:/respond?body=secure", L"GET", false, L"false 0 (12157)  [] 0/0 <> {} "},
+    };
+    for (const Row& row : rows)
+    {
+        SCOPED_TRACE(row.name);
+        CWinHttpClient client(L"");
+        client.SetAdditionalRequestHeaders(L"X-One: 1");
+        client.SetAdditionalRequestCookies(L"a=1; b=2");
+        if (row.setup != nullptr)
+            row.setup(client);
+        bool result = false;
+        for (const std::wstring* path : {&row.before, &row.path})
+        {
+            if (path->empty())
+                continue;
+            const bool secure = path->rfind(L"https:", 0) == 0;
+            client.UpdateUrl((*path)[0] == L'/' || secure ? ServerUrl(path->substr(secure ? 6 : 0), secure)
+                                                          : *path);
+            if (std::wstring(row.method) == L"POST")
+                client.SetAdditionalDataToSend(reinterpret_cast<const unsigned char*>("k=v"), 3);
+            NewTraceLines();
+            result = client.SendHttpRequest(row.method, row.redirectOff);
+        }
+        std::wstring failedSend;
+        for (const std::wstring& line : NewTraceLines())
+            if (line.rfind(L"[TRC] Send failed with error [", 0) == 0)
+                failedSend = line.substr(30, line.size() - 31);
+        EXPECT_EQ(KelvraStrings::Strings::Format(
+                      L"%s %u (%s) %s [%s] %u/%u <%s> {%s} %s", result ? L"true" : L"false",
+                      client.GetLastError(), failedSend.c_str(), client.GetResponseStatusCode().c_str(),
+                      client.GetResponseCharset().c_str(), client.GetRawResponseReceivedContentLength(),
+                      client.GetRawResponseContentLength(), client.GetResponseLocation().c_str(),
+                      client.GetResponseCookies().c_str(), client.GetResponseContent().c_str()),
+                  row.expected);
+        EXPECT_TRUE(!result ||
+                    client.GetRawResponseContent()[client.GetRawResponseReceivedContentLength()] == 0);
+    }
+}
+
+// 64 MiB arrive whole and are saved byte for byte; progress goes from 0 to 100 with a
+// Content-Length and is never reported without one. Nothing is saved without a body, and a write
+// that fails is no success.
+TEST(HttpExchanges, LargeBodySavedWithProgress)
+{
+    const std::wstring file = KelvraTest::DataPath(L"large_body.bin");
+    CWinHttpClient client(ServerUrl(L"/respond"), &RecordProgress);
+    EXPECT_FALSE(client.SaveResponseToFile(file));
+    ASSERT_TRUE(client.SendHttpRequest(L"GET", false));
+    EXPECT_FALSE(client.SaveResponseToFile(file));
+    EXPECT_FALSE(std::filesystem::exists(file));
+
+    client.UpdateUrl(ServerUrl(L"/big?size=67108864"));
+    ASSERT_TRUE(client.SendHttpRequest(L"GET", false));
+    EXPECT_FALSE(client.SaveResponseToFile(L"Z:\\dev\\full"));
+    ASSERT_TRUE(client.SaveResponseToFile(file));
+    std::string expected(64u << 20, '\0');
+    for (size_t i = 0; i < expected.size(); ++i)
+        expected[i] = static_cast<char>(33 + (i % 65521) * 7919 % 94); // BLOCK in http_server.py
+    EXPECT_TRUE(KelvraTest::ReadBinaryFile(file) == expected) << "the saved body differs";
+    EXPECT_TRUE(std::filesystem::remove(file));
+    ASSERT_GE(progressReports.size(), 2u);
+    EXPECT_EQ(progressReports.front(), 0.0);
+    EXPECT_EQ(progressReports.back(), 100.0);
+    EXPECT_TRUE(std::is_sorted(progressReports.begin(), progressReports.end()));
+
+    CWinHttpClient chunked(ServerUrl(L"/big?chunked=1&size=100000"), &RecordProgress);
+    progressReports.clear();
+    ASSERT_TRUE(chunked.SendHttpRequest(L"GET", false));
+    EXPECT_EQ(chunked.GetResponseContent().size(), 100000u);
+    EXPECT_TRUE(progressReports.empty());
+}
+
+// The lines of a new client's GET and POST, and of a connection refused, exactly.
+TEST(HttpTrace, SequencesOfAClientsLife)
+{
+    const auto life =
+        [](const std::wstring& url, const wchar_t* method, const std::string& body, std::wstring& header)
+    {
+        NewTraceLines();
+        {
+            CWinHttpClient client(url);
+            if (!body.empty())
+                client.SetAdditionalDataToSend(reinterpret_cast<const unsigned char*>(body.data()),
+                                               static_cast<std::uint32_t>(body.size()));
+            client.SendHttpRequest(method, false);
+            header = client.GetResponseHeader();
+        }
+        return NewTraceLines();
+    };
+    const auto opening = [](const std::wstring& url, const std::wstring& method, const std::wstring& port,
+                            const std::wstring& path)
+    {
+        return Lines{L"[INF] Constructing the Http client [" + url + L"]",
+                     L"[TRC] Trying to send Http request using method [" + method +
+                         L"], disable auto redirect [false]",
+                     L"[TRC] Creating Http session",
+                     L"[TRC] Setting Http timeouts [0][60000][30000][30000]",
+                     L"[TRC] Extracting url",
+                     L"[TRC] Connecting to server with host [127.0.0.1], port [" + port + L"]",
+                     L"[TRC] Creating the request to [" + path + L"]",
+                     L"[TRC] Request was created",
+                     L"[TRC] Cracking proxy configuration",
+                     L"[TRC] [1] try"};
+    };
+    const auto response = [](const std::wstring& header)
+    {
+        Lines lines = {
+            L"[TRC] Waiting for server's response", L"[TRC] Retrieving response header information size",
+            // WinHTTP gives the size in bytes, its terminator included.
+            L"[TRC] Response header information size [" + std::to_wstring(header.size() * 2 + 2) + L"]",
+            L"[TRC] Retrieving response header information", L"[TRC] Retrieving response status header size",
+            L"[TRC] Response status header size [8]"};
+        for (const wchar_t* bytes : {L"[5] ", L"[0] "})
+            lines.insert(lines.end(),
+                         {L"[TRC] Getting the amount of data, in bytes, available to be read",
+                          L"[TRC] " + std::wstring(bytes) + L"amount of data available to be read",
+                          L"[TRC] Read the data",
+                          L"[TRC] " + std::wstring(bytes) + L"amount of data was read"});
+        lines.insert(lines.end(),
+                     {L"[TRC] Finished reading response available data", L"[TRC] Closing request",
+                      L"[TRC] Closing connection", L"[INF] Destructing the Http client"});
+        return lines;
+    };
+    const std::wstring url = ServerUrl(L"/respond?body=hello");
+    const std::wstring port = url.substr(17, url.find(L'/', 17) - 17);
+    std::wstring header;
+    Lines get = life(url, L"GET", "", header);
+    Lines expected = opening(url, L"GET", port, L"/respond?body=hello");
+    expected.insert(expected.end(),
+                    {L"[TRC] Sending the Http request, total data to send [0]", L"[TRC] Send succeeded"});
+    for (const std::wstring& line : response(header))
+        expected.push_back(line);
+    EXPECT_EQ(get, expected);
+
+    Lines post = life(url, L"post", "name=value", header);
+    expected = opening(url, L"post", port, L"/respond?body=hello");
+    expected.insert(expected.end(),
+                    {L"[TRC] Sending the Http request, total data to send [10]", L"[TRC] Send succeeded",
+                     L"[TRC] Writing data to the request, total data to send [10]",
+                     L"[TRC] Total data sent [10]"});
+    for (const std::wstring& line : response(header))
+        expected.push_back(line);
+    EXPECT_EQ(post, expected);
+
+    expected = opening(L"http://127.0.0.1:1/", L"GET", L"1", L"/");
+    for (int next = 2; next <= 6; ++next)
+        expected.insert(expected.end(), {L"[TRC] Sending the Http request, total data to send [0]",
+                                         L"[TRC] Send failed with error [12029]",
+                                         L"[TRC] [" + std::to_wstring(next) + L"] try"});
+    expected.back() = L"[TRC] Closing request";
+    expected.insert(expected.end(), {L"[TRC] Closing connection", L"[INF] Destructing the Http client"});
+    EXPECT_EQ(life(L"http://127.0.0.1:1/", L"GET", "", header), expected);
+}
