@@ -3,6 +3,7 @@
 #include "KelvraTrace.h"
 
 #include "common/UniqueHandle.h"
+#include "http/BodyBuffer.h"
 #include "http/WinHttpPlatform.h"
 
 #include <cstdio>
@@ -21,7 +22,7 @@ CWinHttpClient::CWinHttpClient(const std::wstring& url, bool (*progress)(double)
 CWinHttpClient::~CWinHttpClient()
 {
     KELVRA_INF(L"Destructing the Http client");
-    delete[] rawResponseContent;
+    KelvraHttp::ReleaseBody(rawResponseContent);
     delete[] additionalDataToSend;
     if (session != nullptr)
         Close(session);

@@ -4,6 +4,7 @@
 
 #include "KelvraTrace.h"
 
+#include "http/BodyBuffer.h"
 #include "http/HeaderPatterns.h"
 #include "http/ResponseText.h"
 #include "http/WinHttpException.h"
@@ -22,7 +23,6 @@ using KelvraHttp::Platform;
 namespace
 {
 
-const std::uint64_t kInitialBodyCapacity = 10240;
 const std::uint64_t kNoLength = UINT64_MAX;
 
 // The size in bytes a header query at level needs, or false when the platform has none to give.
@@ -62,17 +62,13 @@ std::uint32_t DecimalLength(const std::wstring& digits)
     return static_cast<std::uint32_t>(value);
 }
 
-// The capacity that holds needed bytes: doubled as often as needed, but no more than an announced
-// length (and its zero byte) that the body has not passed. 0 when needed does not fit in 32 bits.
-std::uint64_t GrownCapacity(std::uint64_t capacity, std::uint64_t needed, std::uint64_t announced)
+// How much of the body's block to commit for needed bytes: half as much again as is committed, so
+// that commits stay few, but no more than an announced length (and its zero byte) that the body
+// has not passed.
+std::uint64_t CommitTarget(std::uint64_t committed, std::uint64_t needed, std::uint64_t announced)
 {
-    if (needed > UINT32_MAX)
-        return 0;
-    while (capacity < needed)
-        capacity *= 2;
-    if (announced != kNoLength && announced + 1 >= needed)
-        capacity = std::min(capacity, announced + 1);
-    return std::min<std::uint64_t>(capacity, UINT32_MAX);
+    const std::uint64_t target = std::max(needed, committed + committed / 2);
+    return announced != kNoLength && announced + 1 >= needed ? std::min(target, announced + 1) : target;
 }
 
 } // namespace
@@ -125,13 +121,12 @@ void CWinHttpClient::ReadStatusCode(void* request)
 
 void CWinHttpClient::ReadBody(void* connection, void* request, std::uint64_t announcedLength)
 {
-    // The received count describes the buffer at every moment: a request that fails while
-    // reading leaves the bytes read so far, never a count left from a longer body.
-    delete[] rawResponseContent;
-    rawResponseContent = nullptr;
+    // The received count describes the block at every moment: a request that fails while reading
+    // leaves the bytes read so far, never a count left from a longer body.
+    KelvraHttp::ReleaseBody(rawResponseContent);
+    rawResponseContent = KelvraHttp::ReserveBody();
     rawResponseReceivedContentLength = 0;
-    rawResponseContent = new unsigned char[kInitialBodyCapacity]();
-    std::uint64_t capacity = kInitialBodyCapacity;
+    std::uint64_t committed = 0;
     std::uint32_t received = 0;
     DWORD available;
     do
@@ -148,19 +143,13 @@ void CWinHttpClient::ReadBody(void* connection, void* request, std::uint64_t ann
 
         // Read straight into the body, with room for the zero byte that always follows it.
         const std::uint64_t needed = std::uint64_t{received} + available + 1;
-        if (needed > capacity)
+        if (needed > committed && (rawResponseContent == nullptr ||
+                                   !KelvraHttp::CommitBody(rawResponseContent, committed,
+                                                           CommitTarget(committed, needed, announcedLength))))
         {
-            capacity = GrownCapacity(capacity, needed, announcedLength);
-            unsigned char* grown = capacity != 0 ? new (std::nothrow) unsigned char[capacity] : nullptr;
-            if (grown == nullptr)
-            {
-                KELVRA_ERR(L"Response body does not fit in memory [%d]", received);
-                rawResponseReceivedContentLength = received;
-                throw WinHttpException{ERROR_NOT_ENOUGH_MEMORY, connection, request, nullptr};
-            }
-            std::memcpy(grown, rawResponseContent, received);
-            delete[] rawResponseContent;
-            rawResponseContent = grown;
+            KELVRA_ERR(L"Response body does not fit in memory [%d]", received);
+            rawResponseReceivedContentLength = received;
+            throw WinHttpException{ERROR_NOT_ENOUGH_MEMORY, connection, request, nullptr};
         }
         KELVRA_TRC(L"Read the data");
         DWORD read = 0;
