@@ -100,6 +100,8 @@ TEST(HttpExchanges, ResultsAsTheClientShowsThem)
          L"true 0 () 200 [] 0/0 <> {a=1; Path=/; b=2;c=3;} "},
         {"CutHtmlGetSentFiveTimes", nullptr, L"/respond?key=get&body=%3CHTML%3Ecut", L"/count?key=get",
          L"GET", false, L"true 0 () 200 [] 1/1 <> {} 5"},
+        {"WholeHtmlGetSentOnce", nullptr, L"/respond?key=whole&body=%3Chtml%3Eok%3C/HTML%3E",
+         L"/count?key=whole", L"GET", false, L"true 0 () 200 [] 1/1 <> {} 1"},
         {"CutHtmlPostSentOnce", nullptr, L"/respond?key=post&body=%3Chtml%3Ecut", L"/count?key=post", L"POST",
          false, L"true 0 () 200 [] 1/1 <> {} 1"},
         {"CutHtmlWithoutRedirectsSentOnce", nullptr, L"/respond?key=direct&body=%3Chtml%3Ecut",
@@ -188,6 +190,11 @@ TEST(HttpExchanges, LargeBodySavedWithProgress)
     ASSERT_TRUE(chunked.SendHttpRequest(L"GET", false));
     EXPECT_EQ(chunked.GetResponseContent().size(), 100000u);
     EXPECT_TRUE(progressReports.empty());
+
+    // A callback that throws, against its contract, fails the request; nothing leaves it.
+    CWinHttpClient throwing(ServerUrl(L"/respond?body=x"), [](double) -> bool { throw 1; });
+    EXPECT_FALSE(throwing.SendHttpRequest(L"GET", false));
+    EXPECT_EQ(throwing.GetLastError(), 1359u);
 }
 
 // The lines of a new client's GET and POST, and of a connection refused, exactly.

@@ -31,20 +31,23 @@ void SendBody(CWinHttpClient& client)
 
 } // namespace
 
-// User agent, time-outs, flags and headers reach WinHTTP in this order; a second request reuses
-// the session and, with certificates required, sets no security flags.
+// User agent, time-outs, flags, headers and body reach WinHTTP in this order; a second request
+// reuses the session and, with certificates required, sets no security flags; a new URL drops the body.
 TEST(HttpPlatformCalls, SettingsReachThePlatformInOrder)
 {
     RecordingWinHttp platform;
     {
-        CWinHttpClient client(ServerUrl(L"/respond?body=secure", true));
+        const std::wstring url = ServerUrl(L"/respond?body=secure", true);
+        CWinHttpClient client(url);
         client.SetUserAgent(L"Agent/1");
         client.SetTimeouts(1000, 2000, 3000, 4000);
         client.SetAdditionalRequestHeaders(L"X-A: 1");
         client.SetAdditionalRequestCookies(L"a=1");
+        SendBody(client);
         ASSERT_TRUE(client.SendHttpRequest(L"get", true));
         client.SetUserAgent(L"Agent/2");
         client.SetRequireValidSslCertificates(true);
+        client.UpdateUrl(url);
         client.SendHttpRequest(L"GET", false);
     }
     std::wstring calls;
@@ -52,13 +55,14 @@ TEST(HttpPlatformCalls, SettingsReachThePlatformInOrder)
         calls += call + L"\n";
     EXPECT_EQ(calls.find(L"Open Agent/1 0 0\nSetTimeouts 1000 2000 3000 4000\n"), 0u) << calls;
     EXPECT_NE(
-        calls.find(
-            L"OpenRequest GET /respond?body=secure 8388608\nSetOption 31 12544\nAddRequestHeaders "
-            L"X-A: 1 16777216\nAddRequestHeaders Cookie: a=1 16777216\nSetOption 63 2\nSendRequest 0\n"),
+        calls.find(L"OpenRequest GET /respond?body=secure 8388608\nSetOption 31 12544\nAddRequestHeaders "
+                   L"X-A: 1 16777216\nAddRequestHeaders Cookie: a=1 16777216\nSetOption 63 2\nSendRequest 3\n"
+                   L"WriteData 3\nReceiveResponse\n"),
         std::wstring::npos);
     EXPECT_EQ(CountCalls(platform.calls, 0, L"Open "), 1u);
     EXPECT_EQ(CountCalls(platform.calls, 0, L"SetTimeouts 1000 2000 3000 4000"), 2u);
     EXPECT_EQ(CountCalls(platform.calls, 0, L"SetOption 31"), 1u);
+    EXPECT_EQ(CountCalls(platform.calls, 0, L"SendRequest 0"), 5u);
 }
 
 // Each row: a client that holds a response ("first", status 200, header X-Mark: first) posts "k=v"
