@@ -17,17 +17,18 @@ class KELVRA_API CWinHttpClient
 public:
     // progress, when not null, is called on the caller's thread with the percentage of the
     // announced Content-Length received so far (above 100 when more arrives); its result is
-    // ignored and it must not throw.
+    // ignored. It must not throw: one that does fails the request with error 1359.
     explicit CWinHttpClient(const std::wstring& url, bool (*progress)(double) = nullptr);
     ~CWinHttpClient();
     CWinHttpClient(const CWinHttpClient&) = delete;
     CWinHttpClient& operator=(const CWinHttpClient&) = delete;
 
-    // Sends httpVerb ("GET" or "POST", any case) to the URL, with the extra headers, cookies and
-    // body set, up to five tries; a GET whose HTML body lacks its closing tag is sent again unless
-    // disableAutoRedirect. True when a response was read, whatever its status (404 included).
-    // False with GetLastError: 3 empty URL, 87 other verb, 8 out of memory (a body of 4 GiB or
-    // more included), else the WinHTTP error; 0 when every send failed. Never throws.
+    // Sends httpVerb ("GET" or "POST", any case) to the URL with the extra headers, cookies and
+    // body set, up to five tries. disableAutoRedirect returns a 3xx as the response; otherwise
+    // redirects are followed and a GET whose HTML body lacks "</html>" is sent again. True when a
+    // response was read, whatever its status (404 included). False with GetLastError: 3 empty
+    // URL, 87 other verb, 8 out of memory (a body of 4 GiB or more included), else the WinHTTP
+    // error; 0 when every send failed. Never throws.
     bool SendHttpRequest(const std::wstring& httpVerb, bool disableAutoRedirect);
 
     // The user agent reaches WinHTTP once, when the first request opens the session.

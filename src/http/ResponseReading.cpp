@@ -13,9 +13,7 @@
 
 #include <algorithm>
 #include <climits>
-#include <cstring>
 #include <cwchar>
-#include <new>
 #include <vector>
 
 using KelvraHttp::Platform;

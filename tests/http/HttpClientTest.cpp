@@ -22,9 +22,10 @@ class TraceSession : public testing::Environment
 {
     void SetUp() override
     {
-        m_created = std::filesystem::create_directory(L"c:\\keltrace");
+        m_created = std::filesystem::create_directory(KelvraTraceTest::kMarker);
         Debug::start(L"http_tests", false, false);
         ASSERT_NE(CLog::_log, nullptr) << "no trace session in c:\\keltrace";
+        KelvraHttpTest::traceLogSeen = KelvraTraceTest::ReadMarkerFile(L"http_tests.log").size();
     }
     void TearDown() override
     {
@@ -33,9 +34,9 @@ class TraceSession : public testing::Environment
         std::fclose(CLog::_log);
         CLog::_log = nullptr;
         Debug::unlock();
-        std::filesystem::remove(L"c:\\keltrace\\http_tests.log");
+        std::filesystem::remove(KelvraTraceTest::kMarker / L"http_tests.log");
         if (m_created)
-            std::filesystem::remove(L"c:\\keltrace");
+            std::filesystem::remove(KelvraTraceTest::kMarker);
     }
     bool m_created = false;
 };
@@ -145,8 +146,8 @@ TEST(HttpExchanges, ResultsAsTheClientShowsThem)
         }
         std::wstring failedSend;
         for (const std::wstring& line : NewTraceLines())
-            if (line.rfind(L"[TRC] Send failed with error [", 0) == 0)
-                failedSend = line.substr(30, line.size() - 31);
+            if (line.rfind(L"TRC Send failed with error [", 0) == 0)
+                failedSend = line.substr(28, line.size() - 29);
         EXPECT_EQ(KelvraStrings::Strings::Format(
                       L"%s %u (%s) %s [%s] %u/%u <%s> {%s} %s", result ? L"true" : L"false",
                       client.GetLastError(), failedSend.c_str(), client.GetResponseStatusCode().c_str(),
@@ -217,37 +218,37 @@ TEST(HttpTrace, SequencesOfAClientsLife)
             text += line + L"\n";
         return text;
     };
-    const wchar_t* opening = LR"([INF] Constructing the Http client [%s]
-[TRC] Trying to send Http request using method [%s], disable auto redirect [false]
-[TRC] Creating Http session
-[TRC] Setting Http timeouts [0][60000][30000][30000]
-[TRC] Extracting url
-[TRC] Connecting to server with host [127.0.0.1], port [%s]
-[TRC] Creating the request to [%s]
-[TRC] Request was created
-[TRC] Cracking proxy configuration
+    const wchar_t* opening = LR"(INF Constructing the Http client [%s]
+TRC Trying to send Http request using method [%s], disable auto redirect [false]
+TRC Creating Http session
+TRC Setting Http timeouts [0][60000][30000][30000]
+TRC Extracting url
+TRC Connecting to server with host [127.0.0.1], port [%s]
+TRC Creating the request to [%s]
+TRC Request was created
+TRC Cracking proxy configuration
 )";
-    const wchar_t* answered = LR"([TRC] [1] try
-[TRC] Sending the Http request, total data to send [%d]
-[TRC] Send succeeded
-%s[TRC] Waiting for server's response
-[TRC] Retrieving response header information size
-[TRC] Response header information size [%d]
-[TRC] Retrieving response header information
-[TRC] Retrieving response status header size
-[TRC] Response status header size [8]
-[TRC] Getting the amount of data, in bytes, available to be read
-[TRC] [5] amount of data available to be read
-[TRC] Read the data
-[TRC] [5] amount of data was read
-[TRC] Getting the amount of data, in bytes, available to be read
-[TRC] [0] amount of data available to be read
-[TRC] Read the data
-[TRC] [0] amount of data was read
-[TRC] Finished reading response available data
+    const wchar_t* answered = LR"(TRC [1] try
+TRC Sending the Http request, total data to send [%d]
+TRC Send succeeded
+%sTRC Waiting for server's response
+TRC Retrieving response header information size
+TRC Response header information size [%d]
+TRC Retrieving response header information
+TRC Retrieving response status header size
+TRC Response status header size [8]
+TRC Getting the amount of data, in bytes, available to be read
+TRC [5] amount of data available to be read
+TRC Read the data
+TRC [5] amount of data was read
+TRC Getting the amount of data, in bytes, available to be read
+TRC [0] amount of data available to be read
+TRC Read the data
+TRC [0] amount of data was read
+TRC Finished reading response available data
 )";
     const std::wstring closing =
-        L"[TRC] Closing request\n[TRC] Closing connection\n[INF] Destructing the Http client\n";
+        L"TRC Closing request\nTRC Closing connection\nINF Destructing the Http client\n";
     const std::wstring url = ServerUrl(L"/respond?body=hello");
     const std::wstring port = url.substr(17, url.find(L'/', 17) - 17);
     const std::wstring get = life(url, L"GET", "");
@@ -255,13 +256,13 @@ TEST(HttpTrace, SequencesOfAClientsLife)
                        Strings::Format(answered, 0, L"", headerSize) + closing);
     const std::wstring post = life(url, L"post", "name=value");
     const wchar_t* writing =
-        L"[TRC] Writing data to the request, total data to send [10]\n[TRC] Total data sent [10]\n";
+        L"TRC Writing data to the request, total data to send [10]\nTRC Total data sent [10]\n";
     EXPECT_EQ(post, Strings::Format(opening, url.c_str(), L"post", port.c_str(), L"/respond?body=hello") +
                         Strings::Format(answered, 10, writing, headerSize) + closing);
     std::wstring refused = Strings::Format(opening, L"http://127.0.0.1:1/", L"GET", L"1", L"/");
     for (int attempt = 1; attempt <= 5; ++attempt)
-        refused += Strings::Format(L"[TRC] [%d] try\n[TRC] Sending the Http request, total data to send [0]\n"
-                                   L"[TRC] Send failed with error [12029]\n",
+        refused += Strings::Format(L"TRC [%d] try\nTRC Sending the Http request, total data to send [0]\n"
+                                   L"TRC Send failed with error [12029]\n",
                                    attempt);
     EXPECT_EQ(life(L"http://127.0.0.1:1/", L"GET", ""), refused + closing);
 }

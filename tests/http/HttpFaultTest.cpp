@@ -76,7 +76,7 @@ TEST(HttpFaults, EachFailureEndsAsDocumented)
         const wchar_t* op;
         DWORD error;
         int occurrence, times;
-        const wchar_t* message; // the [ERR] line that says why, if any
+        const wchar_t* message; // the error line that says why, if any
         // "<result> <last error> x<sends> <status>|<content>|<X-Mark>|<received>"
         std::wstring expected;
         DWORD available = 0;
@@ -152,10 +152,10 @@ TEST(HttpFaults, EachFailureEndsAsDocumented)
                       row.expected);
             const auto traced = [&](const std::wstring& line)
             { return std::find(trace.begin(), trace.end(), line) != trace.end(); };
-            EXPECT_TRUE(row.message == nullptr || traced(L"[ERR] " + std::wstring(row.message)));
+            EXPECT_TRUE(row.message == nullptr || traced(L"ERR " + std::wstring(row.message)));
             EXPECT_TRUE(
                 row.message == nullptr || result ||
-                traced(L"[ERR] Last documented error [" + std::to_wstring(client.GetLastError()) + L"]"));
+                traced(L"ERR Last documented error [" + std::to_wstring(client.GetLastError()) + L"]"));
             // A refused verb or URL reaches nothing, and only the call itself is traced.
             if (row.times == 0)
             {

@@ -1,14 +1,14 @@
 // What the HTTP client's tests share: the local servers (tests/support/http_server.py, started by
-// ctest) and the trace log of this program, c:\keltrace\http_tests.log (HttpClientTest.cpp opens it).
+// ctest) and the trace log of this program, c:\keltrace\http_tests.log (HttpClientTest.cpp opens it),
+// read with the trace tests' helpers.
 #pragma once
 
 #include "KelvraStrings.h"
 
-#include "common/UniqueHandle.h"
 #include "support/TestData.h"
+#include "trace/TraceTestSupport.h"
 
-#include <share.h>
-
+#include <algorithm>
 #include <string>
 #include <vector>
 
@@ -24,26 +24,19 @@ inline std::wstring ServerUrl(const std::wstring& path, bool secure = false)
            path;
 }
 
-// The trace lines written since the previous call, each as "<tag> <message>" ("[TRC] [1] try").
+// How much of this program's trace log the tests have seen: the session banner, then what
+// NewTraceLines returned.
+inline size_t traceLogSeen = 0;
+
+// The trace lines written since the previous call, each as "<tag> <message>" ("TRC [1] try").
 inline std::vector<std::wstring> NewTraceLines()
 {
-    static long offset = 0;
-    Kelvra::UniqueFile log(::_wfsopen(L"c:\\keltrace\\http_tests.log", L"rb", _SH_DENYNO));
-    std::string text;
-    char buffer[65536];
-    if (log && std::fseek(log.get(), offset, SEEK_SET) == 0)
-        for (size_t got; (got = std::fread(buffer, 1, sizeof(buffer), log.get())) > 0;)
-            text.append(buffer, got);
-    offset += static_cast<long>(text.size());
-    // "[TRC][<stamp>][<file>:<line>] <message>", each line ended by CR LF, after a session banner.
+    const std::string log = KelvraTraceTest::ReadMarkerFile(L"http_tests.log");
     std::vector<std::wstring> lines;
-    for (size_t start = 0, end; (end = text.find("\r\n", start)) != std::string::npos; start = end + 2)
-    {
-        const size_t message = text.find("] ", text.find(']', start + 5) + 1);
-        if (text[start] == '[' && message < end)
-            lines.push_back(KelvraStrings::Strings::ToString(text.substr(start, 5) + ' ' +
-                                                             text.substr(message + 2, end - message - 2)));
-    }
+    for (const std::string& line :
+         KelvraTraceTest::TaggedMessages(log.substr(std::min(traceLogSeen, log.size()))))
+        lines.push_back(KelvraStrings::Strings::ToString(line));
+    traceLogSeen = log.size();
     return lines;
 }
 
