@@ -23,7 +23,7 @@ namespace
 {
 
 const size_t kBodySize = 256u << 20;
-const int kRounds = 3;
+const int kRounds = 5;
 
 // Answers every connection with kBodySize bytes of printable text, "/chunked" in chunks of 64 KiB,
 // anything else with a Content-Length, then closes it.
