@@ -1,13 +1,14 @@
 #!/usr/bin/env bash
 # Quick start on Debian 12 (as root, or with sudo):
-#   ./run.sh demo           build the library and run the demo program under Wine
+#   ./run.sh demo [URL]     build the library and run the demo under Wine: it fetches a sample
+#                           site from a local server, or URL, with a progress bar and the trace on
 #   ./run.sh test           build everything and run every test (what CI runs)
 #   ./run.sh bench [name]   build and run the benchmarks (all, or bench/<name>_bench)
 # Each command first installs the Debian packages it needs when they are missing.
 set -euo pipefail
 cd "$(dirname "$0")"
 
-packages=(cmake ninja-build g++-mingw-w64-x86-64-posix wine wine64 libgnutls30 python3 googletest)
+packages=(cmake ninja-build g++-mingw-w64-x86-64-posix wine wine64 libgnutls30 python3 openssl googletest)
 
 as_root() {
     if [ "$(id -u)" -eq 0 ]; then "$@"; else sudo "$@"; fi
@@ -36,7 +37,18 @@ case "${1:-}" in
 demo)
     install_missing
     build --target kelvra_demo
-    "$wine_run" build/mingw/bin/kelvra_demo.exe
+    state=build/mingw/demo
+    url=${2:-}
+    if [ -z "$url" ]; then
+        # The sample site: a local server stopped by its process id however the demo ends.
+        python3 tests/support/http_server.py start "$state"
+        trap 'python3 tests/support/http_server.py stop "$state"' EXIT
+        url="http://127.0.0.1:$(cat "$state/http_server.port")/site"
+    fi
+    mkdir -p "$state"
+    "$wine_run" build/mingw/bin/kelvra_demo.exe "$url" "Z:$PWD/$state/body.bin"
+    echo "(on this machine: the body is $PWD/$state/body.bin, c:\\keltrace is" \
+        "$PWD/build/mingw/wineprefix/drive_c/keltrace)"
     ;;
 test)
     install_missing
@@ -55,7 +67,7 @@ bench)
     exit $status
     ;;
 *)
-    sed -n '2,6p' "$0" | sed 's/^# \{0,1\}//'
+    sed -n '2,7p' "$0" | sed 's/^# \{0,1\}//'
     exit 2
     ;;
 esac

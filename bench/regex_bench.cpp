@@ -30,7 +30,7 @@ const wchar_t* const kStandardPatterns[] = {
     L"charset=([A-Za-z0-9\\-_]+)",
     L"Content-Length: ([0-9]+)",
     L"Location: ([0-9]+)",
-    L"Location:[ \\t]*([\\s\\S]+?)(?:\\r|\\r?\\n)",
+    L"(?:\\r|\\r?\\n)Location:[ \\t]*([\\s\\S]+?)(?:\\r|\\r?\\n)",
     L"Set-Cookie:[ \\t]*([\\s\\S]+?)(?:\\r|\\r?\\n)",
 };
 

@@ -4,6 +4,7 @@
 #include "KelvraApi.h"
 #include "KelvraBytes.h"
 #include "KelvraEventLog.h"
+#include "KelvraHttp.h"
 #include "KelvraIni.h"
 #include "KelvraLocks.h"
 #include "KelvraStrings.h"

@@ -1,16 +1,14 @@
-// The HTTP client's header patterns over raw header blocks as WinHTTP reports them, fetched from
-// the local HTTP server that ctest starts for this program (tests/support/http_server.py).
-#include "common/UniqueHandle.h"
+// The HTTP client's header patterns over raw header blocks as WinHTTP reports them, fetched by
+// the client from the local HTTP server that ctest starts for this program.
+#include "HttpTestSupport.h"
+
+#include "KelvraHttp.h"
+
 #include "http/HeaderPatterns.h"
 #include "http/pattern/ReferenceMatcher.h"
-#include "support/TestData.h"
 
 #include <gtest/gtest.h>
 
-#include <windows.h>
-#include <winhttp.h>
-
-#include <cstdlib>
 #include <cwchar>
 #include <string>
 #include <vector>
@@ -31,42 +29,17 @@ std::wstring QueryValue(const std::wstring& value)
     return encoded;
 }
 
-// The raw header block (status line and header lines, each ended by CR LF, then an empty line),
-// as WinHTTP reports it, of a response from the local server with these header lines ("Name:
-// value", in this order) and this body. Empty, with a test failure, when the request fails.
+// The raw header block (status line and header lines, each ended by CR LF, then an empty line)
+// of a response from the local server with these header lines ("Name: value", in this order)
+// and this body.
 std::wstring FetchHeaderBlock(const std::vector<std::wstring>& headerLines, const std::wstring& body = L"")
 {
     std::wstring path = L"/respond?body=" + QueryValue(body);
     for (const std::wstring& line : headerLines)
         path += L"&header=" + QueryValue(line);
-    const long port = std::strtol(
-        KelvraTest::ReadBinaryFile(KelvraTest::DataPath(L"http_server.port")).c_str(), nullptr, 10);
-    Kelvra::UniqueWinHttp session(::WinHttpOpen(L"KelvraTests", WINHTTP_ACCESS_TYPE_NO_PROXY,
-                                                WINHTTP_NO_PROXY_NAME, WINHTTP_NO_PROXY_BYPASS, 0));
-    Kelvra::UniqueWinHttp connection(
-        session && port > 0 && port <= 65535
-            ? ::WinHttpConnect(session.get(), L"127.0.0.1", static_cast<INTERNET_PORT>(port), 0)
-            : nullptr);
-    Kelvra::UniqueWinHttp request(connection ? ::WinHttpOpenRequest(connection.get(), L"GET", path.c_str(),
-                                                                    nullptr, WINHTTP_NO_REFERER,
-                                                                    WINHTTP_DEFAULT_ACCEPT_TYPES, 0)
-                                             : nullptr);
-    // Room for any header block these tests ask for.
-    std::wstring block(16384, L'\0');
-    DWORD bytes = static_cast<DWORD>(block.size() * sizeof(wchar_t));
-    if (!request ||
-        !::WinHttpSendRequest(request.get(), WINHTTP_NO_ADDITIONAL_HEADERS, 0, WINHTTP_NO_REQUEST_DATA, 0, 0,
-                              0) ||
-        !::WinHttpReceiveResponse(request.get(), nullptr) ||
-        !::WinHttpQueryHeaders(request.get(), WINHTTP_QUERY_RAW_HEADERS_CRLF, WINHTTP_HEADER_NAME_BY_INDEX,
-                               &block[0], &bytes, WINHTTP_NO_HEADER_INDEX))
-    {
-        const DWORD error = ::GetLastError();
-        ADD_FAILURE() << "no header block from the local HTTP server (port " << port << "), error " << error;
-        return std::wstring();
-    }
-    block.resize(bytes / sizeof(wchar_t));
-    return block;
+    CWinHttpClient client(KelvraHttpTest::ServerUrl(path));
+    EXPECT_TRUE(client.SendHttpRequest(L"GET", true)) << "no answer from the local HTTP server";
+    return client.GetResponseHeader();
 }
 
 } // namespace

@@ -1,75 +1,146 @@
 #!/usr/bin/env python3
-"""Local HTTP server for the tests, on 127.0.0.1 with a port the system picks at start.
+"""Local HTTP and HTTPS servers for the tests and the demo, on 127.0.0.1 with ports the system picks.
 
-    http_server.py start STATE_DIR   start in the background and return once it listens;
-                                     STATE_DIR/http_server.port then holds the port and
-                                     STATE_DIR/http_server.pid the server's process id
+    http_server.py start STATE_DIR   start in the background and return once both listen;
+                                     STATE_DIR/http_server.port and https_server.port then hold
+                                     the ports, STATE_DIR/http_server.pid the process id
     http_server.py stop STATE_DIR    stop that server by its process id
     http_server.py serve STATE_DIR   run in the foreground (what start runs)
 
-Routes (GET or POST):
-    /respond?status=200&header=Name:%20value&header=...&body=text
-        answers with that status (200 if absent), the given header lines in the given order
-        (the parameter may repeat) and that body. A Content-Length is added before them unless
-        one of them is a Content-Length (in any case).
+The HTTPS listener uses a self-signed certificate made with openssl into STATE_DIR at start.
+Routes (GET or POST; percent-encoded values stand for single bytes):
+    /respond?status=200&header=Name:%20value&header=...&body=text&chunked=1&key=name
+        that status (200 if absent), those header lines in order, that body; chunked sends it in
+        pieces of 3 bytes, and otherwise a Content-Length is added unless a header line gives one
+        (the connection then closes after the body, however long the length said it was);
+        key counts the request under that name
+    /count?key=name        how many requests /respond counted under that name, and forgets them
+    /echo                  the method, then the Cookie, Content-Length, User-Agent and X-*
+                           request headers as received, an empty line and the request body
+    /big?size=N&chunked=1  N bytes of generated text (KelvraBigBody), with a Content-Length or chunked
+    /site                  a sample HTML page of about 4 MiB, sent slowly enough to watch
 """
 import http.server
 import os
 import signal
+import ssl
 import subprocess
 import sys
+import threading
 import time
 import urllib.parse
 
 PORT_FILE = "http_server.port"
+HTTPS_PORT_FILE = "https_server.port"
 PID_FILE = "http_server.pid"
 LOG_FILE = "http_server.log"
+# The generated body: byte i is BLOCK[i % len(BLOCK)], printable ASCII (tests rebuild it).
+BLOCK = bytes(33 + (i * 7919) % 94 for i in range(65521))
+counts = {}
+
+
+def generated(size):
+    whole, rest = divmod(size, len(BLOCK))
+    for _ in range(whole):
+        yield BLOCK
+    if rest:
+        yield BLOCK[:rest]
+
+
+def sample_site():
+    lines = (b"<p>Line %05d of the sample page, sent in slow pieces by the local server.</p>\n" % line
+             for line in range(1, 50001))
+    return b"<html><head><title>Kelvra sample site</title></head><body>\n" + b"".join(lines) + b"</body></html>\n"
 
 
 class Handler(http.server.BaseHTTPRequestHandler):
     protocol_version = "HTTP/1.1"
 
+    # A body is read whatever the method: one left unread would reset the connection at its close.
     def do_GET(self):
-        self.answer()
+        self.answer(self.rfile.read(int(self.headers.get("Content-Length") or 0)))
 
-    def do_POST(self):
-        length = int(self.headers.get("Content-Length") or 0)
-        self.rfile.read(length)
-        self.answer()
+    do_POST = do_GET
 
-    def answer(self):
+    def answer(self, request_body):
         url = urllib.parse.urlsplit(self.path)
-        if url.path != "/respond":
-            self.send_error(404)
-            return
-        query = urllib.parse.parse_qs(url.query, keep_blank_values=True)
-        status = int(query.get("status", ["200"])[0])
-        body = query.get("body", [""])[0].encode("utf-8")
-        headers = []
-        for line in query.get("header", []):
-            name, _, value = line.partition(":")
-            headers.append((name, value.lstrip(" ")))
+        query = urllib.parse.parse_qs(url.query, keep_blank_values=True, encoding="latin-1")
+        value = lambda name, default="": query.get(name, [default])[0]
+        headers = [tuple(line.split(":", 1)) for line in query.get("header", [])]
+        if url.path == "/respond":
+            counts[value("key")] = counts.get(value("key"), 0) + 1
+            body = value("body").encode("latin-1")
+            chunked = value("chunked") == "1"
+            pieces = [body[start:start + 3] for start in range(0, len(body), 3)] if chunked else [body]
+            return self.send(int(value("status", "200")), headers, pieces, chunked)
+        if url.path == "/count":
+            return self.send(200, [], [str(counts.pop(value("key"), 0)).encode()])
+        if url.path == "/echo":
+            echoed = [f"{name}: {text}" for name, text in self.headers.items()
+                      if name in ("Cookie", "Content-Length", "User-Agent") or name.startswith("X-")]
+            text = "\n".join([self.command] + echoed + ["", ""]).encode("latin-1")
+            return self.send(200, [], [text + request_body])
+        if url.path == "/big":
+            size = int(value("size", "0"))
+            chunked = value("chunked") == "1"
+            return self.send(200, [] if chunked else [("Content-Length", str(size))], generated(size), chunked)
+        if url.path == "/site":
+            page = sample_site()
+            headers = [("Content-Type", "text/html; charset=utf-8"), ("Set-Cookie", "visitor=demo; Path=/"),
+                       ("Content-Length", str(len(page)))]
+            return self.send(200, headers, [page[at:at + 65536] for at in range(0, len(page), 65536)], pace=0.03)
+        self.send_error(404)
+
+    def send(self, status, headers, pieces, chunked=False, pace=0.0):
         self.send_response(status)
-        if not any(name.lower() == "content-length" for name, _ in headers):
-            self.send_header("Content-Length", str(len(body)))
-        for name, value in headers:
-            self.send_header(name, value)
+        if chunked:
+            self.send_header("Transfer-Encoding", "chunked")
+        elif any(name.lower() == "content-length" for name, _ in headers):
+            self.close_connection = True
+        else:
+            pieces = [b"".join(pieces)]
+            self.send_header("Content-Length", str(len(pieces[0])))
+        for name, text in headers:
+            self.send_header(name, text.lstrip(" "))
+        if isinstance(self.connection, ssl.SSLSocket):
+            # Wine 8 reuses a kept-alive connection in any session, whatever its certificate
+            # policy: a fresh one for every request has its certificate checked each time.
+            self.send_header("Connection", "close")
+            self.close_connection = True
         self.end_headers()
-        self.wfile.write(body)
+        for piece in pieces:
+            self.wfile.write(b"%x\r\n%s\r\n" % (len(piece), piece) if chunked else piece)
+            if pace:
+                time.sleep(pace)
+        if chunked:
+            self.wfile.write(b"0\r\n\r\n")
 
     def log_message(self, format, *args):
         sys.stderr.write("%s %s\n" % (self.address_string(), format % args))
 
 
-def serve(state_dir):
+def listen(state_dir, port_file, tls=None):
     server = http.server.ThreadingHTTPServer(("127.0.0.1", 0), Handler)
-    signal.signal(signal.SIGTERM, lambda *_: sys.exit(0))
+    if tls:
+        server.socket = tls.wrap_socket(server.socket, server_side=True)
+    threading.Thread(target=server.serve_forever, daemon=True).start()
     # The port file appears whole, and only once the socket listens.
-    temporary = os.path.join(state_dir, PORT_FILE + ".tmp")
-    with open(temporary, "w") as port_file:
-        port_file.write(str(server.server_address[1]))
-    os.replace(temporary, os.path.join(state_dir, PORT_FILE))
-    server.serve_forever()
+    temporary = os.path.join(state_dir, port_file + ".tmp")
+    with open(temporary, "w") as file:
+        file.write(str(server.server_address[1]))
+    os.replace(temporary, os.path.join(state_dir, port_file))
+
+
+def serve(state_dir):
+    signal.signal(signal.SIGTERM, lambda *_: sys.exit(0))
+    certificate, key = (os.path.join(state_dir, "https_server." + kind) for kind in ("pem", "key"))
+    subprocess.run(["openssl", "req", "-x509", "-newkey", "rsa:2048", "-nodes", "-days", "2", "-subj",
+                    "/CN=127.0.0.1", "-keyout", key, "-out", certificate], check=True, capture_output=True)
+    tls = ssl.SSLContext(ssl.PROTOCOL_TLS_SERVER)
+    tls.load_cert_chain(certificate, key)
+    listen(state_dir, HTTPS_PORT_FILE, tls)
+    listen(state_dir, PORT_FILE)
+    threading.Event().wait()
 
 
 def start(state_dir):
@@ -94,7 +165,6 @@ def start(state_dir):
 
 def stop(state_dir):
     pid_path = os.path.join(state_dir, PID_FILE)
-    port_path = os.path.join(state_dir, PORT_FILE)
     if os.path.exists(pid_path):
         with open(pid_path) as pid_file:
             pid = int(pid_file.read())
@@ -114,8 +184,9 @@ def stop(state_dir):
         except ProcessLookupError:
             pass
         os.remove(pid_path)
-    if os.path.exists(port_path):
-        os.remove(port_path)
+    for name in (PORT_FILE, HTTPS_PORT_FILE):
+        if os.path.exists(os.path.join(state_dir, name)):
+            os.remove(os.path.join(state_dir, name))
 
 
 def main():

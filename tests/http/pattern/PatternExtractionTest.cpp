@@ -59,7 +59,8 @@ TEST(ExtractPatternGroups, ClientPatternsOnWrittenHeadersAndBodies)
         {kContentLength, L"Content-Length:12\r\n", {}},
         {kLocation, L"Location: /next\r\n", {}},
         {kLocation, L"Location: 42abc\r\n", {L"42"}},
-        {kLocationValue, L"Location: 42abc\r\n", {L"42abc"}},
+        {kLocationValue, L"\r\nLocation: 42abc\r\n", {L"42abc"}},
+        {kLocationValue, L"\r\nContent-Location: /other\r\n", {}},
         // A cookie line ends at its first CR; a last line without line end gives nothing.
         {kCookies, L"Set-Cookie:\t b=2\r\nSet-Cookie: x=1\r\r\nSet-Cookie: last=1", {L"b=2", L"x=1"}},
         {kHtmlStart, body, {L"<HTML>"}},

@@ -1,0 +1,16 @@
+// The failure record of SendHttpRequest: every stage that fails throws one, and the request's
+// single failure path stores the error, releases the proxy record and closes the handles it names.
+// It never leaves SendHttpRequest.
+#pragma once
+
+#include <windows.h>
+#include <winhttp.h>
+
+struct WinHttpException
+{
+    DWORD error;
+    HINTERNET connection;
+    HINTERNET request;
+    // The current user's proxy configuration whose strings are still to be released, or null.
+    WINHTTP_CURRENT_USER_IE_PROXY_CONFIG* proxyConfig;
+};

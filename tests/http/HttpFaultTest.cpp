@@ -1,0 +1,199 @@
+// CWinHttpClient over a binding that records its platform calls and fails chosen ones (the rest
+// reach the local server): what reaches the platform, and how every failure ends.
+#include "HttpTestSupport.h"
+
+#include "KelvraHttp.h"
+
+#include "support/RecordingWinHttp.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+
+using KelvraHttpTest::NewTraceLines;
+using KelvraHttpTest::ServerUrl;
+using KelvraTest::RecordingWinHttp;
+
+namespace
+{
+
+size_t CountCalls(const std::vector<std::wstring>& calls, size_t from, const std::wstring& name)
+{
+    return static_cast<size_t>(std::count_if(calls.begin() + static_cast<std::ptrdiff_t>(from), calls.end(),
+                                             [&](const std::wstring& call)
+                                             { return call.rfind(name, 0) == 0; }));
+}
+
+void SendBody(CWinHttpClient& client)
+{
+    client.SetAdditionalDataToSend(reinterpret_cast<const unsigned char*>("k=v"), 3);
+}
+
+} // namespace
+
+// User agent, time-outs, flags, headers and body reach WinHTTP in this order; a second request
+// reuses the session and, with certificates required, sets no security flags; a new URL drops the body.
+TEST(HttpPlatformCalls, SettingsReachThePlatformInOrder)
+{
+    RecordingWinHttp platform;
+    {
+        const std::wstring url = ServerUrl(L"/respond?body=secure", true);
+        CWinHttpClient client(url);
+        client.SetUserAgent(L"Agent/1");
+        client.SetTimeouts(1000, 2000, 3000, 4000);
+        client.SetAdditionalRequestHeaders(L"X-A: 1");
+        client.SetAdditionalRequestCookies(L"a=1");
+        SendBody(client);
+        ASSERT_TRUE(client.SendHttpRequest(L"get", true));
+        client.SetUserAgent(L"Agent/2");
+        client.SetRequireValidSslCertificates(true);
+        client.UpdateUrl(url);
+        client.SendHttpRequest(L"GET", false);
+    }
+    std::wstring calls;
+    for (const std::wstring& call : platform.calls)
+        calls += call + L"\n";
+    EXPECT_EQ(calls.find(L"Open Agent/1 0 0\nSetTimeouts 1000 2000 3000 4000\n"), 0u) << calls;
+    EXPECT_NE(
+        calls.find(L"OpenRequest GET /respond?body=secure 8388608\nSetOption 31 12544\nAddRequestHeaders "
+                   L"X-A: 1 16777216\nAddRequestHeaders Cookie: a=1 16777216\nSetOption 63 2\nSendRequest 3\n"
+                   L"WriteData 3\nReceiveResponse\n"),
+        std::wstring::npos);
+    EXPECT_EQ(CountCalls(platform.calls, 0, L"Open "), 1u);
+    EXPECT_EQ(CountCalls(platform.calls, 0, L"SetTimeouts 1000 2000 3000 4000"), 2u);
+    EXPECT_EQ(CountCalls(platform.calls, 0, L"SetOption 31"), 1u);
+    EXPECT_EQ(CountCalls(platform.calls, 0, L"SendRequest 0"), 5u);
+}
+
+// Each row: a client that holds a response ("first", status 200, header X-Mark: first) posts "k=v"
+// with redirects off, the extra header X-A and a cookie, for a second response (404, "second",
+// X-Mark: second) with the row's fault in force; then it sends once more without.
+TEST(HttpFaults, EachFailureEndsAsDocumented)
+{
+    struct Row
+    {
+        const char* name;
+        const wchar_t* op;
+        DWORD error;
+        int occurrence, times;
+        const wchar_t* message; // the error line that says why, if any
+        // "<result> <last error> x<sends> <status>|<content>|<X-Mark>|<received>"
+        std::wstring expected;
+        DWORD available = 0;
+        const wchar_t* url = nullptr; // instead of the second response's
+        const wchar_t* method = L"POST";
+    };
+    const Row rows[] = {
+        {"Session", L"Open", 12001, 1, 1, L"Creating Http session failed", L"false 12001 x0 |||0"},
+        {"UrlSplitting", L"CrackUrl", 12006, 1, 1, L"Extracting url failed",
+         L"false 12006 x0 200|first|first|5"},
+        {"Connect", L"Connect", 12007, 1, 1, L"Connecting failed", L"false 12007 x0 200|first|first|5"},
+        {"OpenRequest", L"OpenRequest", 12004, 1, 1, L"Creating the request failed",
+         L"false 12004 x0 200|first|first|5"},
+        {"ExtraHeaders", L"AddRequestHeaders", 87, 1, 1, L"Adding request headers failed",
+         L"false 87 x0 200|first|first|5"},
+        {"CookieHeader", L"AddRequestHeaders", 87, 2, 1, L"Adding request headers cookie failed",
+         L"false 87 x0 200|first|first|5"},
+        {"RedirectOption", L"SetOption", 12018, 1, 1, L"Disabling auto redirect option failed",
+         L"false 12018 x0 200|first|first|5"},
+        {"BodyWrite", L"WriteData", 12030, 1, 1, L"Writing data to the request failed",
+         L"false 12030 x1 200|first|first|5"},
+        {"Receive", L"ReceiveResponse", 12002, 1, 1, L"Waiting for server's response failed [12002]",
+         L"false 12002 x1 200|first|first|5"},
+        {"ResendAskedOnTriesOneToFour", L"ReceiveResponse", 12032, 1, 4,
+         L"Waiting for server's response failed [12032]", L"true 0 x5 404|second|second|6"},
+        {"ResendAskedOnTryFive", L"ReceiveResponse", 12032, 1, 5,
+         L"Waiting for server's response failed [12032]", L"false 12032 x5 200|first|first|5"},
+        {"EverySendFails", L"SendRequest", 12029, 1, 5, nullptr, L"false 0 x5 200|first|first|5"},
+        {"DataAvailable", L"QueryDataAvailable", 12030, 1, 1,
+         L"Failed to get the amount of data, in bytes, available to be read",
+         L"false 12030 x1 404|first|second|0"},
+        {"BodyBeyond32Bits", L"QueryDataAvailable", 0, 2, 1, L"Response body does not fit in memory [6]",
+         L"false 8 x1 404|first|second|6", 0xFFFFFFFA},
+        {"HeaderSizeQuery", L"QueryHeaders", 12150, 1, 1, nullptr, L"true 0 x1 404|second|first|6"},
+        {"HeaderQuery", L"QueryHeaders", 12150, 2, 1, nullptr, L"true 0 x1 404|second|first|6"},
+        {"StatusSizeQuery", L"QueryHeaders", 12150, 3, 1, nullptr, L"true 0 x1 200|second|second|6"},
+        {"StatusQuery", L"QueryHeaders", 12150, 4, 1, nullptr, L"true 0 x1 200|second|second|6"},
+        {"FailedReadAddsNothing", L"ReadData", 12030, 1, 1, nullptr, L"true 0 x1 404|second|second|6"},
+        {"UndecodableBody", L"MultiByteToWideChar", 1113, 1, 2, nullptr, L"true 0 x1 404|first|second|6"},
+        {"OtherVerb", L"GlobalFree", 0, 0, 0, nullptr, L"false 87 x0 200|first|first|5", 0, nullptr, L"PUT"},
+        {"EmptyUrl", L"GlobalFree", 0, 0, 0, nullptr, L"false 3 x0 200|first|first|5", 0, L""},
+    };
+    const std::wstring second = ServerUrl(L"/respond?status=404&body=second&header=X-Mark:%20second");
+    for (const Row& row : rows)
+    {
+        SCOPED_TRACE(row.name);
+        RecordingWinHttp platform;
+        {
+            CWinHttpClient client(ServerUrl(L"/respond?body=first&header=X-Mark:%20first"));
+            client.SetAdditionalRequestHeaders(L"X-A: 1");
+            client.SetAdditionalRequestCookies(L"c=1");
+            // A failing session needs a client that has none yet.
+            if (std::wstring(row.op) != L"Open")
+                client.SendHttpRequest(L"GET", false);
+            platform.Add({row.op, row.error, row.occurrence, row.times, row.available});
+            client.UpdateUrl(row.url != nullptr ? row.url : second);
+            SendBody(client);
+            const size_t callsBefore = platform.calls.size();
+            NewTraceLines();
+            const bool result = client.SendHttpRequest(row.method, true);
+            const std::vector<std::wstring> trace = NewTraceLines();
+
+            const std::wstring header = client.GetResponseHeader();
+            const size_t mark = header.find(L"X-Mark: ");
+            EXPECT_EQ(KelvraStrings::Strings::Format(
+                          L"%s %u x%u %s|%s|%s|%u", result ? L"true" : L"false", client.GetLastError(),
+                          static_cast<unsigned>(CountCalls(platform.calls, callsBefore, L"SendRequest")),
+                          client.GetResponseStatusCode().c_str(), client.GetResponseContent().c_str(),
+                          mark == std::wstring::npos
+                              ? L""
+                              : header.substr(mark + 8, header.find(L'\r', mark) - mark - 8).c_str(),
+                          client.GetRawResponseReceivedContentLength()),
+                      row.expected);
+            const auto traced = [&](const std::wstring& line)
+            { return std::find(trace.begin(), trace.end(), line) != trace.end(); };
+            EXPECT_TRUE(row.message == nullptr || traced(L"ERR " + std::wstring(row.message)));
+            EXPECT_TRUE(
+                row.message == nullptr || result ||
+                traced(L"ERR Last documented error [" + std::to_wstring(client.GetLastError()) + L"]"));
+            // A refused verb or URL reaches nothing, and only the call itself is traced.
+            if (row.times == 0)
+            {
+                EXPECT_EQ(platform.calls.size(), callsBefore);
+                EXPECT_EQ(trace.size(), 1u);
+            }
+            // Only the session outlives the call; the next call reuses it.
+            EXPECT_EQ(platform.open.size(), std::wstring(row.op) == L"Open" ? 0u : 1u);
+            platform.ClearFaults();
+            client.UpdateUrl(second);
+            EXPECT_TRUE(client.SendHttpRequest(L"GET", false));
+            EXPECT_EQ(CountCalls(platform.calls, 0, L"Open "), std::wstring(row.op) == L"Open" ? 2u : 1u);
+        }
+        EXPECT_TRUE(platform.open.empty());
+        EXPECT_EQ(platform.strayCloses, 0);
+    }
+}
+
+// Whichever platform call fails, the request leaves no handle open and closes none twice.
+TEST(HttpFaults, AnyPlatformCallFailing)
+{
+    const auto request = []()
+    {
+        CWinHttpClient client(ServerUrl(L"/respond?body=abc"));
+        client.SetAdditionalRequestHeaders(L"X-A: 1");
+        client.SetAdditionalRequestCookies(L"c=1");
+        SendBody(client);
+        client.SendHttpRequest(L"POST", true);
+    };
+    RecordingWinHttp clean;
+    request();
+    ASSERT_GT(clean.calls.size(), 15u);
+    for (int failing = 1; failing <= static_cast<int>(clean.calls.size()); ++failing)
+    {
+        RecordingWinHttp platform;
+        platform.FailCall(failing, 12345);
+        request();
+        EXPECT_TRUE(platform.open.empty()) << clean.calls[failing - 1];
+        EXPECT_EQ(platform.strayCloses, 0) << clean.calls[failing - 1];
+    }
+}
