@@ -90,7 +90,8 @@ private:
     // Stages of SendHttpRequest (src/http/); they hand failures to its single failure path.
     void OpenSession();
     void PrepareRequest(void* connection, void* request, bool secure, bool disableAutoRedirect);
-    void SelectProxy(void* connection, void* request);
+    // userProxyConfig: the request's zero-filled WINHTTP_CURRENT_USER_IE_PROXY_CONFIG.
+    void SelectProxy(void* connection, void* request, void* userProxyConfig);
     bool SendUntilAccepted(void* connection, void* request, bool isGet, bool disableAutoRedirect);
     void ReadResponse(void* connection, void* request);
     std::uint64_t ReadHeaderBlock(void* request);

@@ -8,6 +8,8 @@
 #include "support/TestData.h"
 #include "trace/TraceTestSupport.h"
 
+#include <windows.h>
+
 #include <algorithm>
 #include <string>
 #include <vector>
@@ -39,5 +41,45 @@ inline std::vector<std::wstring> NewTraceLines()
     traceLogSeen = log.size();
     return lines;
 }
+
+// The current user's proxy settings as Wine's WinHTTP reads them: DefaultConnectionSettings, 0x46,
+// a counter, flags (1 direct, 2 proxy, 4 auto-config URL), then the proxy, bypass list and
+// auto-config URL, each a length and ANSI bytes. The object sets none, and puts back what it found
+// when it goes (the http tests hold the ctest lock hkcu_proxy).
+class UserProxySettings
+{
+public:
+    UserProxySettings()
+        : m_read(
+              ::RegGetValueW(HKEY_CURRENT_USER, kKey, kValue, RRF_RT_REG_BINARY, nullptr, m_saved, &m_size))
+    {
+        Set(L"", L"", L"");
+    }
+    ~UserProxySettings()
+    {
+        if (m_read == ERROR_SUCCESS)
+            ::RegSetKeyValueW(HKEY_CURRENT_USER, kKey, kValue, REG_BINARY, m_saved, m_size);
+        else if (m_read == ERROR_FILE_NOT_FOUND)
+            ::RegDeleteKeyValueW(HKEY_CURRENT_USER, kKey, kValue);
+    }
+    // Empty texts are left out.
+    static void Set(const std::wstring& proxy, const std::wstring& bypass, const std::wstring& script)
+    {
+        std::string value;
+        const auto add = [&](size_t number) { value.append(reinterpret_cast<const char*>(&number), 4); };
+        add(0x46), add(0), add(1 | (proxy.empty() ? 0 : 2) | (script.empty() ? 0 : 4));
+        for (const std::wstring* text : {&proxy, &bypass, &script})
+            add(text->size()), value.append(text->begin(), text->end());
+        ::RegSetKeyValueW(HKEY_CURRENT_USER, kKey, kValue, REG_BINARY, value.data(), DWORD(value.size()));
+    }
+
+private:
+    static constexpr const wchar_t* kKey =
+        L"Software\\Microsoft\\Windows\\CurrentVersion\\Internet Settings\\Connections";
+    static constexpr const wchar_t* kValue = L"DefaultConnectionSettings";
+    char m_saved[65536];
+    DWORD m_size = sizeof(m_saved);
+    LONG m_read; // what reading the value gave
+};
 
 } // namespace KelvraHttpTest
