@@ -42,10 +42,9 @@ inline std::vector<std::wstring> NewTraceLines()
     return lines;
 }
 
-// The current user's proxy settings as Wine's WinHTTP reads them: DefaultConnectionSettings, 0x46,
-// a counter, flags (1 direct, 2 proxy, 4 auto-config URL), then the proxy, bypass list and
-// auto-config URL, each a length and ANSI bytes. The object sets none, and puts back what it found
-// when it goes (the http tests hold the ctest lock hkcu_proxy).
+// The current user's proxy settings, in the registry value Wine's WinHTTP reads (README): none
+// while the object lives, unless set, then the value found is put back. Holders run under the
+// ctest lock hkcu_proxy.
 class UserProxySettings
 {
 public:
@@ -62,7 +61,7 @@ public:
         else if (m_read == ERROR_FILE_NOT_FOUND)
             ::RegDeleteKeyValueW(HKEY_CURRENT_USER, kKey, kValue);
     }
-    // Empty texts are left out.
+    // 0x46, a counter, flags (1 direct, 2 proxy, 4 script), then each text as a length and ANSI bytes.
     static void Set(const std::wstring& proxy, const std::wstring& bypass, const std::wstring& script)
     {
         std::string value;
@@ -79,7 +78,7 @@ private:
     static constexpr const wchar_t* kValue = L"DefaultConnectionSettings";
     char m_saved[65536];
     DWORD m_size = sizeof(m_saved);
-    LONG m_read; // what reading the value gave
+    LONG m_read; // what reading the value gave: restored if read, removed if absent
 };
 
 } // namespace KelvraHttpTest
