@@ -27,6 +27,7 @@ void Release(UniquePlatformText& text, const wchar_t* message)
     text.reset();
 }
 
+// The same for a field of a platform record, which is left empty.
 void Release(wchar_t*& field, const wchar_t* message)
 {
     UniquePlatformText text(std::exchange(field, nullptr));
