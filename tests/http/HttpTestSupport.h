@@ -49,15 +49,20 @@ class UserProxySettings
 {
 public:
     UserProxySettings()
-        : m_read(
-              ::RegGetValueW(HKEY_CURRENT_USER, kKey, kValue, RRF_RT_REG_BINARY, nullptr, m_saved, &m_size))
     {
+        DWORD size = 0;
+        m_read = ::RegGetValueW(HKEY_CURRENT_USER, kKey, kValue, RRF_RT_REG_BINARY, nullptr, nullptr, &size);
+        m_saved.resize(size);
+        if (m_read == ERROR_SUCCESS)
+            m_read = ::RegGetValueW(HKEY_CURRENT_USER, kKey, kValue, RRF_RT_REG_BINARY, nullptr, &m_saved[0],
+                                    &size);
         Set(L"", L"", L"");
     }
     ~UserProxySettings()
     {
         if (m_read == ERROR_SUCCESS)
-            ::RegSetKeyValueW(HKEY_CURRENT_USER, kKey, kValue, REG_BINARY, m_saved, m_size);
+            ::RegSetKeyValueW(HKEY_CURRENT_USER, kKey, kValue, REG_BINARY, m_saved.data(),
+                              DWORD(m_saved.size()));
         else if (m_read == ERROR_FILE_NOT_FOUND)
             ::RegDeleteKeyValueW(HKEY_CURRENT_USER, kKey, kValue);
     }
@@ -76,9 +81,8 @@ private:
     static constexpr const wchar_t* kKey =
         L"Software\\Microsoft\\Windows\\CurrentVersion\\Internet Settings\\Connections";
     static constexpr const wchar_t* kValue = L"DefaultConnectionSettings";
-    char m_saved[65536];
-    DWORD m_size = sizeof(m_saved);
-    LONG m_read; // what reading the value gave: restored if read, removed if absent
+    std::string m_saved;
+    LONG m_read; // restored if read, removed if absent
 };
 
 } // namespace KelvraHttpTest
