@@ -42,7 +42,9 @@ public:
     // A non-empty name decodes every later body with that charset, whatever the responses name;
     // an empty one releases it (responses' charsets apply again).
     bool SetForceCharset(const std::wstring& charset);
-    // A manual proxy, with an optional user name and password, replaces the user's settings.
+    // A manual proxy list (as WinHTTP reads one, any length) replaces the current user's settings;
+    // empty, the default, uses them: their auto-config script, else their proxy and bypass list.
+    // The password reaches the proxy only together with a user name.
     bool SetProxy(const std::wstring& proxy);
     bool SetProxyUsername(const std::wstring& username);
     bool SetProxyPassword(const std::wstring& password);
@@ -90,7 +92,9 @@ private:
     // Stages of SendHttpRequest (src/http/); they hand failures to its single failure path.
     void OpenSession();
     void PrepareRequest(void* connection, void* request, bool secure, bool disableAutoRedirect);
-    void SelectProxy(void* connection, void* request);
+    // userProxyConfig: SendHttpRequest's WINHTTP_CURRENT_USER_IE_PROXY_CONFIG, filled here; the
+    // failure path releases what it still holds.
+    void SelectProxy(void* connection, void* request, void* userProxyConfig);
     bool SendUntilAccepted(void* connection, void* request, bool isGet, bool disableAutoRedirect);
     void ReadResponse(void* connection, void* request);
     std::uint64_t ReadHeaderBlock(void* request);

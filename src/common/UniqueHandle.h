@@ -108,14 +108,6 @@ struct WinHttpHandleTraits
     static void close(pointer value) noexcept { ::WinHttpCloseHandle(value); }
 };
 
-// Text the platform allocates with GlobalAlloc and the caller frees (WinHTTP proxy settings).
-struct GlobalTextTraits
-{
-    using pointer = wchar_t*;
-    static pointer invalid() noexcept { return nullptr; }
-    static void close(pointer value) noexcept { ::GlobalFree(value); }
-};
-
 // Memory the platform allocates with LocalAlloc (FormatMessageW, ConvertSidToStringSidW).
 struct LocalMemoryTraits
 {
@@ -141,7 +133,6 @@ using UniqueFile = UniqueHandle<CrtFileTraits>;
 using UniqueRegKey = UniqueHandle<RegKeyTraits>;
 using UniqueEventSource = UniqueHandle<EventSourceTraits>;
 using UniqueWinHttp = UniqueHandle<WinHttpHandleTraits>;
-using UniqueGlobalText = UniqueHandle<GlobalTextTraits>;
 using UniqueLocalMemory = UniqueHandle<LocalMemoryTraits>;
 using UniqueCrtLocale = UniqueHandle<CrtLocaleTraits>;
 

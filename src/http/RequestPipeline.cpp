@@ -11,6 +11,7 @@
 
 #include <new>
 
+using KelvraHttp::Fail;
 using KelvraHttp::Platform;
 using KelvraHttp::UniquePlatformHandle;
 
@@ -30,21 +31,6 @@ struct SplitUrl
     wchar_t path[1500];
 };
 
-// The failure record of a stage that failed before any handle was opened.
-[[noreturn]] void FailWithoutHandles(const wchar_t* message)
-{
-    const DWORD error = Platform().GetLastError();
-    KELVRA_ERR(L"%s", message);
-    throw WinHttpException{error, nullptr, nullptr, nullptr};
-}
-
-[[noreturn]] void Fail(const wchar_t* message, HINTERNET connection, HINTERNET request)
-{
-    const DWORD error = Platform().GetLastError();
-    KELVRA_ERR(L"%s", message);
-    throw WinHttpException{error, connection, request, nullptr};
-}
-
 // Host and path with any query; a host or path too long for its buffer fails here.
 SplitUrl Split(const std::wstring& url)
 {
@@ -57,7 +43,7 @@ SplitUrl Split(const std::wstring& url)
     components.lpszUrlPath = split.path;
     components.dwUrlPathLength = ARRAYSIZE(split.path);
     if (!Platform().CrackUrl(url.c_str(), static_cast<DWORD>(url.size()), 0, &components))
-        FailWithoutHandles(L"Extracting url failed");
+        Fail(L"Extracting url failed", nullptr, nullptr);
     split.scheme = components.nScheme;
     split.port = components.nPort;
     return split;
@@ -72,6 +58,14 @@ void AddHeaders(HINTERNET connection, HINTERNET request, const std::wstring& tex
 }
 
 } // namespace
+
+void KelvraHttp::Fail(const wchar_t* message, HINTERNET connection, HINTERNET request,
+                      WINHTTP_CURRENT_USER_IE_PROXY_CONFIG* proxyConfig)
+{
+    const DWORD error = Platform().GetLastError();
+    KELVRA_ERR(L"%s", message);
+    throw WinHttpException{error, connection, request, proxyConfig};
+}
 
 bool CWinHttpClient::SendHttpRequest(const std::wstring& httpVerb, bool disableAutoRedirect)
 {
@@ -92,6 +86,8 @@ bool CWinHttpClient::SendHttpRequest(const std::wstring& httpVerb, bool disableA
 
     UniquePlatformHandle connection;
     UniquePlatformHandle request;
+    // Filled by proxy selection; whatever it still holds when the request fails is released below.
+    WINHTTP_CURRENT_USER_IE_PROXY_CONFIG userProxyConfig{};
     WinHttpException failure{};
     try
     {
@@ -108,7 +104,7 @@ bool CWinHttpClient::SendHttpRequest(const std::wstring& httpVerb, bool disableA
         requestHost = split.host;
         connection.reset(Platform().Connect(session, split.host, split.port, 0));
         if (!connection)
-            FailWithoutHandles(L"Connecting failed");
+            Fail(L"Connecting failed", nullptr, nullptr);
 
         KELVRA_TRC(L"Creating the request to [%s]", split.path);
         const bool secure = split.scheme == INTERNET_SCHEME_HTTPS;
@@ -121,7 +117,7 @@ bool CWinHttpClient::SendHttpRequest(const std::wstring& httpVerb, bool disableA
 
         PrepareRequest(connection.get(), request.get(), secure, disableAutoRedirect);
         KELVRA_TRC(L"Cracking proxy configuration");
-        SelectProxy(connection.get(), request.get());
+        SelectProxy(connection.get(), request.get(), &userProxyConfig);
 
         const bool accepted = SendUntilAccepted(connection.get(), request.get(), isGet, disableAutoRedirect);
         KELVRA_TRC(L"Closing request");
@@ -137,13 +133,14 @@ bool CWinHttpClient::SendHttpRequest(const std::wstring& httpVerb, bool disableA
     catch (const std::bad_alloc&)
     {
         KELVRA_ERR(L"Out of memory");
-        failure = WinHttpException{ERROR_NOT_ENOUGH_MEMORY, connection.get(), request.get(), nullptr};
+        failure =
+            WinHttpException{ERROR_NOT_ENOUGH_MEMORY, connection.get(), request.get(), &userProxyConfig};
     }
     catch (...)
     {
         // Only a progress callback that throws, against its contract, gets here.
         KELVRA_ERR(L"Unexpected exception");
-        failure = WinHttpException{ERROR_INTERNAL_ERROR, connection.get(), request.get(), nullptr};
+        failure = WinHttpException{ERROR_INTERNAL_ERROR, connection.get(), request.get(), &userProxyConfig};
     }
 
     lastError = failure.error;
@@ -171,7 +168,7 @@ void CWinHttpClient::OpenSession()
     session = Platform().Open(userAgent.c_str(), WINHTTP_ACCESS_TYPE_DEFAULT_PROXY, WINHTTP_NO_PROXY_NAME,
                               WINHTTP_NO_PROXY_BYPASS, 0);
     if (session == nullptr)
-        FailWithoutHandles(L"Creating Http session failed");
+        Fail(L"Creating Http session failed", nullptr, nullptr);
 }
 
 void CWinHttpClient::PrepareRequest(void* connection, void* request, bool secure, bool disableAutoRedirect)

@@ -67,4 +67,13 @@ struct PlatformHandleTraits
 };
 using UniquePlatformHandle = Kelvra::UniqueHandle<PlatformHandleTraits>;
 
+// Text the proxy calls hand out (GlobalAlloc), freed through the binding in force.
+struct PlatformTextTraits
+{
+    using pointer = wchar_t*;
+    static pointer invalid() noexcept { return nullptr; }
+    static void close(pointer value) noexcept { Platform().GlobalFree(value); }
+};
+using UniquePlatformText = Kelvra::UniqueHandle<PlatformTextTraits>;
+
 } // namespace KelvraHttp

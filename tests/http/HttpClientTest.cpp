@@ -5,6 +5,8 @@
 #include "KelvraHttp.h"
 #include "KelvraTrace.h"
 
+#include "support/RecordingWinHttp.h"
+
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -198,10 +200,14 @@ TEST(HttpExchanges, LargeBodySavedWithProgress)
     EXPECT_EQ(throwing.GetLastError(), 1359u);
 }
 
-// The lines of a new client's GET and POST, and of a connection refused, exactly.
+// The lines of a new client's GET and POST, and of a connection refused, exactly, with no proxy
+// settings; and of a GET through each kind of the user's proxy settings, as Wine and the recording
+// binding (error 2, the look-up Wine refuses) answer.
 TEST(HttpTrace, SequencesOfAClientsLife)
 {
     using KelvraStrings::Strings;
+    KelvraHttpTest::UserProxySettings settings;
+    KelvraTest::RecordingWinHttp platform;
     int headerSize = 0;
     const auto life = [&](const std::wstring& url, const wchar_t* method, const char* body)
     {
@@ -228,6 +234,7 @@ TRC Creating the request to [%s]
 TRC Request was created
 TRC Cracking proxy configuration
 )";
+    const std::wstring user = L"TRC Setting auto proxy settings\n";
     const wchar_t* answered = LR"(TRC [1] try
 TRC Sending the Http request, total data to send [%d]
 TRC Send succeeded
@@ -252,17 +259,56 @@ TRC Finished reading response available data
     const std::wstring url = ServerUrl(L"/respond?body=hello");
     const std::wstring port = url.substr(17, url.find(L'/', 17) - 17);
     const std::wstring get = life(url, L"GET", "");
-    EXPECT_EQ(get, Strings::Format(opening, url.c_str(), L"GET", port.c_str(), L"/respond?body=hello") +
-                       Strings::Format(answered, 0, L"", headerSize) + closing);
+    const std::wstring getOpening =
+        Strings::Format(opening, url.c_str(), L"GET", port.c_str(), L"/respond?body=hello");
+    const std::wstring getAnswered = Strings::Format(answered, 0, L"", headerSize) + closing;
+    EXPECT_EQ(get, getOpening + user + getAnswered);
     const std::wstring post = life(url, L"post", "name=value");
     const wchar_t* writing =
         L"TRC Writing data to the request, total data to send [10]\nTRC Total data sent [10]\n";
     EXPECT_EQ(post, Strings::Format(opening, url.c_str(), L"post", port.c_str(), L"/respond?body=hello") +
-                        Strings::Format(answered, 10, writing, headerSize) + closing);
-    std::wstring refused = Strings::Format(opening, L"http://127.0.0.1:1/", L"GET", L"1", L"/");
+                        user + Strings::Format(answered, 10, writing, headerSize) + closing);
+    std::wstring refused = Strings::Format(opening, L"http://127.0.0.1:1/", L"GET", L"1", L"/") + user;
     for (int attempt = 1; attempt <= 5; ++attempt)
         refused += Strings::Format(L"TRC [%d] try\nTRC Sending the Http request, total data to send [0]\n"
                                    L"TRC Send failed with error [12029]\n",
                                    attempt);
     EXPECT_EQ(life(L"http://127.0.0.1:1/", L"GET", ""), refused + closing);
+
+    // Through each kind of user's settings. Wine refuses the script's look-up (87); the binding
+    // answers it once, with lists of its own.
+    platform.Add({L"GetIEProxyConfigForCurrentUser", ERROR_FILE_NOT_FOUND});
+    EXPECT_EQ(life(url, L"GET", ""),
+              getOpening + user + L"TRC No Internet Explorer proxy settings can be found\n" + getAnswered);
+    const std::wstring bypass = L"<local>;" + std::wstring(300, L'b') + L".example";
+    settings.Set(L"127.0.0.1:8888", bypass, L"");
+    const std::wstring released = L"TRC Releasing lpszProxy\nTRC Releasing lpszProxyBypass\n";
+    EXPECT_EQ(life(url, L"GET", ""),
+              getOpening + user +
+                  L"TRC Could not find IE Auto Config Url but IE proxy url is set to [127.0.0.1:8888]\n"
+                  L"TRC IE optional proxy by-pass server list is set to [" +
+                  bypass +
+                  L"]\n"
+                  L"TRC Setting IE proxy data to the request\n" +
+                  released + getAnswered);
+    const std::wstring script =
+        ServerUrl(L"/respond?body=function%20FindProxyForURL(u,h){return%22PROXY%20127.0.0.1:8888%22}");
+    settings.Set(L"127.0.0.1:8888", L"<local>", script);
+    const std::wstring lookUp =
+        user + L"TRC IE Auto Config Url is set to [" + script + L"]\nTRC Retrieving user's proxy data\n";
+    const std::wstring userReleased = L"TRC Releasing lpszAutoConfigUrl\n" + released;
+    platform.lookedUpProxy = {L"127.0.0.1:8889", L"*.local"};
+    EXPECT_EQ(life(url, L"GET", ""), getOpening + lookUp + L"TRC Setting user's proxy data\n" + released +
+                                         userReleased + getAnswered);
+    platform.lookedUpProxy.clear();
+    EXPECT_EQ(life(url, L"GET", ""), getOpening + lookUp +
+                                         L"ERR Failed to retrieve user's proxy data\n"
+                                         L"ERR Last documented error [87]\n" +
+                                         userReleased + closing);
+    for (const std::wstring& call :
+         {L"SetOption 38 3 127.0.0.1:8888 " + bypass, L"GetProxyForUrl " + url + L" 3 1 " + script + L" 1",
+          std::wstring(L"SetOption 38 3 127.0.0.1:8889 *.local")})
+        EXPECT_GE(std::count(platform.calls.begin(), platform.calls.end(), call), 1) << call;
+    EXPECT_TRUE(platform.handedOut.empty());
+    EXPECT_EQ(platform.strayFrees, 0);
 }

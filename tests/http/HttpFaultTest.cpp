@@ -31,14 +31,20 @@ void SendBody(CWinHttpClient& client)
 
 } // namespace
 
-// User agent, time-outs, flags, headers and body reach WinHTTP in this order; a second request
-// reuses the session and, with certificates required, sets no security flags; a new URL drops the body.
+// User agent, time-outs, flags, headers, manual proxy (whole, however long) with its credentials
+// (their bytes, no terminator) and body reach WinHTTP in this order; a second request reuses the
+// session and, with certificates required, sets no security flags; a new URL drops the body; a
+// password without a user name is never sent.
 TEST(HttpPlatformCalls, SettingsReachThePlatformInOrder)
 {
     RecordingWinHttp platform;
+    const std::wstring proxy = std::wstring(300, L'p') + L".example:8080";
     {
         const std::wstring url = ServerUrl(L"/respond?body=secure", true);
         CWinHttpClient client(url);
+        client.SetProxy(proxy);
+        client.SetProxyUsername(L"user");
+        client.SetProxyPassword(L"pass");
         client.SetUserAgent(L"Agent/1");
         client.SetTimeouts(1000, 2000, 3000, 4000);
         client.SetAdditionalRequestHeaders(L"X-A: 1");
@@ -47,6 +53,7 @@ TEST(HttpPlatformCalls, SettingsReachThePlatformInOrder)
         ASSERT_TRUE(client.SendHttpRequest(L"get", true));
         client.SetUserAgent(L"Agent/2");
         client.SetRequireValidSslCertificates(true);
+        client.SetProxyUsername(L"");
         client.UpdateUrl(url);
         client.SendHttpRequest(L"GET", false);
     }
@@ -55,21 +62,29 @@ TEST(HttpPlatformCalls, SettingsReachThePlatformInOrder)
         calls += call + L"\n";
     EXPECT_EQ(calls.find(L"Open Agent/1 0 0\nSetTimeouts 1000 2000 3000 4000\n"), 0u) << calls;
     EXPECT_NE(
-        calls.find(L"OpenRequest GET /respond?body=secure 8388608\nSetOption 31 12544\nAddRequestHeaders "
-                   L"X-A: 1 16777216\nAddRequestHeaders Cookie: a=1 16777216\nSetOption 63 2\nSendRequest 3\n"
-                   L"WriteData 3\nReceiveResponse\n"),
+        calls.find(
+            L"OpenRequest GET /respond?body=secure 8388608\nSetOption 31 12544\nAddRequestHeaders "
+            L"X-A: 1 16777216\nAddRequestHeaders Cookie: a=1 16777216\nSetOption 63 2\nSetOption 38 3 " +
+            proxy +
+            L" null\nSetOption 4098 user\nSetOption 4099 pass\nSendRequest 3\nWriteData 3\n"
+            L"ReceiveResponse\n"),
         std::wstring::npos);
     EXPECT_EQ(CountCalls(platform.calls, 0, L"Open "), 1u);
     EXPECT_EQ(CountCalls(platform.calls, 0, L"SetTimeouts 1000 2000 3000 4000"), 2u);
     EXPECT_EQ(CountCalls(platform.calls, 0, L"SetOption 31"), 1u);
     EXPECT_EQ(CountCalls(platform.calls, 0, L"SendRequest 0"), 5u);
+    EXPECT_EQ(CountCalls(platform.calls, 0, L"SetOption 38 3 " + proxy), 2u);
+    EXPECT_EQ(CountCalls(platform.calls, 0, L"SetOption 4099"), 1u);
 }
 
 // Each row: a client that holds a response ("first", status 200, header X-Mark: first) posts "k=v"
 // with redirects off, the extra header X-A and a cookie, for a second response (404, "second",
-// X-Mark: second) with the row's fault in force; then it sends once more without.
+// X-Mark: second) with the row's proxy settings and fault in force; then it sends once more without.
 TEST(HttpFaults, EachFailureEndsAsDocumented)
 {
+    // The proxy settings of the second request: none, manual (127.0.0.1:8888 with a user name and a
+    // password), the user's fixed proxy and bypass list, or also a script that answers a proxy.
+    constexpr int none = 0, manual = 1, fixed = 2, script = 3;
     struct Row
     {
         const char* name;
@@ -77,8 +92,10 @@ TEST(HttpFaults, EachFailureEndsAsDocumented)
         DWORD error;
         int occurrence, times;
         const wchar_t* message; // the error line that says why, if any
-        // "<result> <last error> x<sends> <status>|<content>|<X-Mark>|<received>"
+        // "<result> <last error> x<sends> <status>|<content>|<X-Mark>|<received>", then the texts
+        // released ("Releasing lpsz<text>"), in order
         std::wstring expected;
+        int proxy = none;
         DWORD available = 0;
         const wchar_t* url = nullptr; // instead of the second response's
         const wchar_t* method = L"POST";
@@ -109,20 +126,36 @@ TEST(HttpFaults, EachFailureEndsAsDocumented)
          L"Failed to get the amount of data, in bytes, available to be read",
          L"false 12030 x1 404|first|second|0"},
         {"BodyBeyond32Bits", L"QueryDataAvailable", 0, 2, 1, L"Response body does not fit in memory [6]",
-         L"false 8 x1 404|first|second|6", 0xFFFFFFFA},
+         L"false 8 x1 404|first|second|6", none, 0xFFFFFFFA},
         {"HeaderSizeQuery", L"QueryHeaders", 12150, 1, 1, nullptr, L"true 0 x1 404|second|first|6"},
         {"HeaderQuery", L"QueryHeaders", 12150, 2, 1, nullptr, L"true 0 x1 404|second|first|6"},
         {"StatusSizeQuery", L"QueryHeaders", 12150, 3, 1, nullptr, L"true 0 x1 200|second|second|6"},
         {"StatusQuery", L"QueryHeaders", 12150, 4, 1, nullptr, L"true 0 x1 200|second|second|6"},
         {"FailedReadAddsNothing", L"ReadData", 12030, 1, 1, nullptr, L"true 0 x1 404|second|second|6"},
         {"UndecodableBody", L"MultiByteToWideChar", 1113, 1, 2, nullptr, L"true 0 x1 404|first|second|6"},
-        {"OtherVerb", L"GlobalFree", 0, 0, 0, nullptr, L"false 87 x0 200|first|first|5", 0, nullptr, L"PUT"},
-        {"EmptyUrl", L"GlobalFree", 0, 0, 0, nullptr, L"false 3 x0 200|first|first|5", 0, L""},
+        {"OtherVerb", L"GlobalFree", 0, 0, 0, nullptr, L"false 87 x0 200|first|first|5", none, 0, nullptr,
+         L"PUT"},
+        {"EmptyUrl", L"GlobalFree", 0, 0, 0, nullptr, L"false 3 x0 200|first|first|5", none, 0, L""},
+        {"ManualProxy", L"SetOption", 12005, 2, 1, L"Setting manual proxy settings failed",
+         L"false 12005 x0 200|first|first|5", manual},
+        {"ManualProxyUserName", L"SetOption", 12005, 3, 1, L"Setting manual proxy username failed",
+         L"false 12005 x0 200|first|first|5", manual},
+        {"ManualProxyPassword", L"SetOption", 12005, 4, 1, L"Setting manual proxy password fialed",
+         L"false 12005 x0 200|first|first|5", manual},
+        {"UserProxyQuery", L"GetIEProxyConfigForCurrentUser", 5, 1, 1,
+         L"Failed to auto detect proxy settings", L"false 5 x0 200|first|first|5", fixed},
+        {"ScriptLookUp", L"GetProxyForUrl", 12167, 1, 1, L"Failed to retrieve user's proxy data",
+         L"false 12167 x0 200|first|first|5 AutoConfigUrl Proxy ProxyBypass", script},
+        {"LookedUpProxy", L"SetOption", 12005, 2, 1, L"Setting user's proxy data failed",
+         L"false 12005 x0 200|first|first|5 AutoConfigUrl Proxy ProxyBypass", script},
+        {"UsersFixedProxy", L"SetOption", 12005, 2, 1, L"Setting IE proxy data to the request failed",
+         L"false 12005 x0 200|first|first|5 Proxy ProxyBypass", fixed},
     };
     const std::wstring second = ServerUrl(L"/respond?status=404&body=second&header=X-Mark:%20second");
     for (const Row& row : rows)
     {
         SCOPED_TRACE(row.name);
+        KelvraHttpTest::UserProxySettings settings;
         RecordingWinHttp platform;
         {
             CWinHttpClient client(ServerUrl(L"/respond?body=first&header=X-Mark:%20first"));
@@ -131,6 +164,14 @@ TEST(HttpFaults, EachFailureEndsAsDocumented)
             // A failing session needs a client that has none yet.
             if (std::wstring(row.op) != L"Open")
                 client.SendHttpRequest(L"GET", false);
+            if (row.proxy == manual)
+                client.SetProxy(L"127.0.0.1:8888"), client.SetProxyUsername(L"u"),
+                    client.SetProxyPassword(L"p");
+            if (row.proxy >= fixed)
+                settings.Set(L"127.0.0.1:8888", L"<local>",
+                             row.proxy == script ? L"http://127.0.0.1:1/p.pac" : L"");
+            if (row.proxy == script)
+                platform.lookedUpProxy = {L"127.0.0.1:8889", L"*.local"};
             platform.Add({row.op, row.error, row.occurrence, row.times, row.available});
             client.UpdateUrl(row.url != nullptr ? row.url : second);
             SendBody(client);
@@ -141,14 +182,17 @@ TEST(HttpFaults, EachFailureEndsAsDocumented)
 
             const std::wstring header = client.GetResponseHeader();
             const size_t mark = header.find(L"X-Mark: ");
+            std::wstring released;
+            for (const std::wstring& line : trace)
+                released += line.rfind(L"TRC Releasing lpsz", 0) == 0 ? L" " + line.substr(18) : L"";
             EXPECT_EQ(KelvraStrings::Strings::Format(
-                          L"%s %u x%u %s|%s|%s|%u", result ? L"true" : L"false", client.GetLastError(),
+                          L"%s %u x%u %s|%s|%s|%u%s", result ? L"true" : L"false", client.GetLastError(),
                           static_cast<unsigned>(CountCalls(platform.calls, callsBefore, L"SendRequest")),
                           client.GetResponseStatusCode().c_str(), client.GetResponseContent().c_str(),
                           mark == std::wstring::npos
                               ? L""
                               : header.substr(mark + 8, header.find(L'\r', mark) - mark - 8).c_str(),
-                          client.GetRawResponseReceivedContentLength()),
+                          client.GetRawResponseReceivedContentLength(), released.c_str()),
                       row.expected);
             const auto traced = [&](const std::wstring& line)
             { return std::find(trace.begin(), trace.end(), line) != trace.end(); };
@@ -171,6 +215,8 @@ TEST(HttpFaults, EachFailureEndsAsDocumented)
         }
         EXPECT_TRUE(platform.open.empty());
         EXPECT_EQ(platform.strayCloses, 0);
+        EXPECT_TRUE(platform.handedOut.empty());
+        EXPECT_EQ(platform.strayFrees, 0);
     }
 }
 

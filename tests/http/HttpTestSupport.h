@@ -8,6 +8,8 @@
 #include "support/TestData.h"
 #include "trace/TraceTestSupport.h"
 
+#include <windows.h>
+
 #include <algorithm>
 #include <string>
 #include <vector>
@@ -39,5 +41,48 @@ inline std::vector<std::wstring> NewTraceLines()
     traceLogSeen = log.size();
     return lines;
 }
+
+// The current user's proxy settings, in the registry value Wine's WinHTTP reads (README): none
+// while the object lives, unless set, then the value found is put back. Holders run under the
+// ctest lock hkcu_proxy.
+class UserProxySettings
+{
+public:
+    UserProxySettings()
+    {
+        DWORD size = 0;
+        m_read = ::RegGetValueW(HKEY_CURRENT_USER, kKey, kValue, RRF_RT_REG_BINARY, nullptr, nullptr, &size);
+        m_saved.resize(size);
+        if (m_read == ERROR_SUCCESS)
+            m_read = ::RegGetValueW(HKEY_CURRENT_USER, kKey, kValue, RRF_RT_REG_BINARY, nullptr, &m_saved[0],
+                                    &size);
+        Set(L"", L"", L"");
+    }
+    ~UserProxySettings()
+    {
+        if (m_read == ERROR_SUCCESS)
+            ::RegSetKeyValueW(HKEY_CURRENT_USER, kKey, kValue, REG_BINARY, m_saved.data(),
+                              DWORD(m_saved.size()));
+        else if (m_read == ERROR_FILE_NOT_FOUND)
+            ::RegDeleteKeyValueW(HKEY_CURRENT_USER, kKey, kValue);
+    }
+    // 0x46, a counter, flags (1 direct, 2 proxy, 4 script), then each text as a length and ANSI bytes.
+    static void Set(const std::wstring& proxy, const std::wstring& bypass, const std::wstring& script)
+    {
+        std::string value;
+        const auto add = [&](size_t number) { value.append(reinterpret_cast<const char*>(&number), 4); };
+        add(0x46), add(0), add(1 | (proxy.empty() ? 0 : 2) | (script.empty() ? 0 : 4));
+        for (const std::wstring* text : {&proxy, &bypass, &script})
+            add(text->size()), value.append(text->begin(), text->end());
+        ::RegSetKeyValueW(HKEY_CURRENT_USER, kKey, kValue, REG_BINARY, value.data(), DWORD(value.size()));
+    }
+
+private:
+    static constexpr const wchar_t* kKey =
+        L"Software\\Microsoft\\Windows\\CurrentVersion\\Internet Settings\\Connections";
+    static constexpr const wchar_t* kValue = L"DefaultConnectionSettings";
+    std::string m_saved;
+    LONG m_read; // restored if read, removed if absent
+};
 
 } // namespace KelvraHttpTest

@@ -5,6 +5,7 @@
 
 #include "http/WinHttpPlatform.h"
 
+#include <cstring>
 #include <map>
 #include <set>
 #include <string>
@@ -44,6 +45,12 @@ public:
     std::vector<std::wstring> calls;
     std::set<HINTERNET> open;
     int strayCloses = 0; // of handles not open: closed twice, or never opened
+    // Proxy texts handed out and not yet freed, and frees of anything else.
+    std::set<HGLOBAL> handedOut;
+    int strayFrees = 0;
+    // When set, GetProxyForUrl answers a named proxy with these proxy and bypass lists (as Wine
+    // cannot: it refuses the auto-detection that comes with a script).
+    std::vector<std::wstring> lookedUpProxy;
 
     HINTERNET Open(const wchar_t* agent, DWORD access, const wchar_t* proxy, const wchar_t* bypass,
                    DWORD flags) override
@@ -72,10 +79,18 @@ public:
         return Opened(Call(Text(L"OpenRequest", verb, path, flags), &Platform::OpenRequest, connection, verb,
                            path, version, referrer, types, flags));
     }
+    // Records a proxy's access type and lists, a credential's length / 2 characters, or a number.
     BOOL SetOption(HINTERNET handle, DWORD option, void* buffer, DWORD length) override
     {
-        const DWORD value = length == sizeof(DWORD) ? *static_cast<DWORD*>(buffer) : 0;
-        return Call(Text(L"SetOption", option, value), &Platform::SetOption, handle, option, buffer, length);
+        const auto* proxy = static_cast<const WINHTTP_PROXY_INFO*>(buffer);
+        const std::wstring text =
+            option == WINHTTP_OPTION_PROXY && length == sizeof(*proxy)
+                ? Text(L"SetOption 38", proxy->dwAccessType, static_cast<const wchar_t*>(proxy->lpszProxy),
+                       static_cast<const wchar_t*>(proxy->lpszProxyBypass))
+            : option == WINHTTP_OPTION_PROXY_USERNAME || option == WINHTTP_OPTION_PROXY_PASSWORD
+                ? Text(L"SetOption", option, std::wstring(static_cast<const wchar_t*>(buffer), length / 2))
+                : Text(L"SetOption", option, length == sizeof(DWORD) ? *static_cast<DWORD*>(buffer) : 0);
+        return Call(text, &Platform::SetOption, handle, option, buffer, length);
     }
     BOOL AddRequestHeaders(HINTERNET request, const wchar_t* headers, DWORD length, DWORD modifiers) override
     {
@@ -126,17 +141,26 @@ public:
     }
     BOOL GetIEProxyConfigForCurrentUser(WINHTTP_CURRENT_USER_IE_PROXY_CONFIG* config) override
     {
-        return Call(Text(L"GetIEProxyConfigForCurrentUser"), &Platform::GetIEProxyConfigForCurrentUser,
-                    config);
+        const BOOL result =
+            Call(Text(L"GetIEProxyConfigForCurrentUser"), &Platform::GetIEProxyConfigForCurrentUser, config);
+        return HandedOut(result, {config->lpszAutoConfigUrl, config->lpszProxy, config->lpszProxyBypass});
     }
     BOOL GetProxyForUrl(HINTERNET session, const wchar_t* url, WINHTTP_AUTOPROXY_OPTIONS* options,
                         WINHTTP_PROXY_INFO* info) override
     {
-        return Call(Text(L"GetProxyForUrl", url), &Platform::GetProxyForUrl, session, url, options, info);
+        const std::wstring text = Text(L"GetProxyForUrl", url, options->dwFlags, options->dwAutoDetectFlags,
+                                       options->lpszAutoConfigUrl, options->fAutoLogonIfChallenged);
+        BOOL result = FALSE;
+        if (lookedUpProxy.empty())
+            result = Call(text, &Platform::GetProxyForUrl, session, url, options, info);
+        else if ((result = !Failing(text)))
+            *info = {WINHTTP_ACCESS_TYPE_NAMED_PROXY, Copy(lookedUpProxy[0]), Copy(lookedUpProxy[1])};
+        return HandedOut(result, {info->lpszProxy, info->lpszProxyBypass});
     }
     HGLOBAL GlobalFree(HGLOBAL memory) override
     {
         Failing(L"GlobalFree");
+        strayFrees += handedOut.erase(memory) == 0 ? 1 : 0;
         return m_native.GlobalFree(memory);
     }
     int MultiByteToWideChar(UINT codePage, DWORD flags, const char* bytes, int count, wchar_t* text,
@@ -186,6 +210,19 @@ private:
             return Result{};
         const Result result = (m_native.*method)(args...);
         m_lastError = m_native.GetLastError();
+        return result;
+    }
+    // Text as WinHTTP hands it out.
+    static wchar_t* Copy(const std::wstring& text)
+    {
+        const size_t size = (text.size() + 1) * sizeof(wchar_t);
+        return static_cast<wchar_t*>(std::memcpy(::GlobalAlloc(GMEM_FIXED, size), text.c_str(), size));
+    }
+    BOOL HandedOut(BOOL result, std::initializer_list<wchar_t*> texts)
+    {
+        for (wchar_t* text : texts)
+            if (result && text != nullptr)
+                handedOut.insert(text);
         return result;
     }
     HINTERNET Opened(HINTERNET handle)
