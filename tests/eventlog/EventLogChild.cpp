@@ -7,7 +7,8 @@
 int main()
 {
     COSEventLog log;
-    const bool error = log.Log(1, 1, 1001, L"error entry %s #%d", L"disk full", 42);
+    // Category 2 is the warning type: an error entry passed with the two swapped shows as a warning.
+    const bool error = log.Log(1, 2, 1001, L"error entry %s #%d", L"disk full", 42);
     const bool warning = log.Log(2, 2, 1002, L"warning entry %s", L"low memory");
     const bool information = log.Log(4, 3, 1003, L"information entry %d%% %hs", 75, "done");
     log.UnInitializeEventLog();

@@ -22,6 +22,7 @@ TEST(RegexLiteralsAndClasses, MatchAsTabled)
         {L"a.c", L"ac", kNoMatch, 0, {}},
         {L"a\\.c", L"abc a.c", L"a.c", 4, {}},
         {L"[b-d]", L"abc", L"b", 1, {}},
+        {L"[a-a]", L"ba", L"a", 1, {}},
         {L"[^a-c]", L"abcd", L"d", 3, {}},
         {L"[A-Z]", L"1Q", L"Q", 1, {}},
         {L"[xy]", L"aYb", L"Y", 1, {}},
@@ -113,6 +114,8 @@ TEST(RegexQuantifiers, GreedyAndLazyMatchAsTabled)
         {L"{.+?}b", L"aabab", L"aab", 0, {L"aa"}},
         {L"{.*}b", L"aabab", L"aabab", 0, {L"aaba"}},
         {L"{.*?}b", L"aabab", L"aab", 0, {L"aa"}},
+        // '.' takes characters beyond ASCII too, also where the loop decides whether to take one more.
+        {L"{.*}", L"a\u00e9b", L"a\u00e9b", 0, {L"a\u00e9b"}},
         {L"(ab)+", L"ababx", L"abab", 0, {}},
         {L"[0-9]+", L"abc 123 4", L"123", 4, {}},
         {L"x[0-9]*?y", L"x12y", L"x12y", 0, {}},
