@@ -17,13 +17,24 @@
 namespace KelvraHttpTest
 {
 
-// "http://127.0.0.1:<port>" or "https://127.0.0.1:<port>" followed by path.
-inline std::wstring ServerUrl(const std::wstring& path, bool secure = false)
+// "http://127.0.0.1:<port>" or "https://127.0.0.1:<port>" followed by path, for the listener whose
+// port stands in portFile.
+inline std::wstring LocalUrl(const wchar_t* portFile, const std::wstring& path, bool secure = false)
 {
-    const std::string port =
-        KelvraTest::ReadBinaryFile(KelvraTest::DataPath(secure ? L"https_server.port" : L"http_server.port"));
+    const std::string port = KelvraTest::ReadBinaryFile(KelvraTest::DataPath(portFile));
     return (secure ? L"https://127.0.0.1:" : L"http://127.0.0.1:") + std::wstring(port.begin(), port.end()) +
            path;
+}
+
+inline std::wstring ServerUrl(const std::wstring& path, bool secure = false)
+{
+    return LocalUrl(secure ? L"https_server.port" : L"http_server.port", path, secure);
+}
+
+// The hostile listener's scripted reply of that name.
+inline std::wstring HostileUrl(const std::wstring& reply)
+{
+    return LocalUrl(L"hostile_server.port", L"/" + reply);
 }
 
 // How much of this program's trace log the tests have seen: the session banner, then what
