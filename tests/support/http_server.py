@@ -27,6 +27,7 @@ a connection cut short, a reply that stalls), then closes.
 import http.server
 import os
 import signal
+import socket
 import socketserver
 import ssl
 import subprocess
@@ -61,9 +62,15 @@ def sample_site():
 
 class Handler(http.server.BaseHTTPRequestHandler):
     protocol_version = "HTTP/1.1"
+    # Headers and body leave in separate writes: with Nagle's algorithm the body would wait for
+    # the client's delayed acknowledgement of the headers, some 40 ms a request.
+    disable_nagle_algorithm = True
 
     # A body is read whatever the method: one left unread would reset the connection at its close.
+    # The client holds its body back until its headers are acknowledged (Nagle's algorithm on its
+    # side): acknowledging them at once saves a delayed acknowledgement a request.
     def do_GET(self):
+        self.connection.setsockopt(socket.IPPROTO_TCP, socket.TCP_QUICKACK, 1)
         self.answer(self.rfile.read(int(self.headers.get("Content-Length") or 0)))
 
     do_POST = do_GET
