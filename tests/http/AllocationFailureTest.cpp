@@ -97,7 +97,9 @@ std::wstring CompileAndMatch(long long failing)
     return L"capture of " + std::to_wstring(capture.end - capture.start);
 }
 
-// The cookie pattern over three cookies of 300 characters, each taking the stack beyond 256.
+// The cookie pattern over three cookies of 300 characters, each taking the stack beyond 256. (A
+// match that memory cut short once passed for the end of the matches: true, with the cookies
+// found before it.)
 std::wstring ExtractCookies(long long failing)
 {
     std::wstring header = L"HTTP/1.1 200 OK\r\n";
