@@ -4,6 +4,8 @@
 #                           site from a local server, or URL, with a progress bar and the trace on
 #   ./run.sh test           build everything and run every test (what CI runs)
 #   ./run.sh bench [name]   build and run the benchmarks (all, or bench/<name>_bench)
+#   ./run.sh soak [count]   build and run the soak of the HTTP client: count requests (10,000)
+#                           against the local servers, printing handles and private memory
 # Each command first installs the Debian packages it needs when they are missing.
 set -euo pipefail
 cd "$(dirname "$0")"
@@ -66,8 +68,17 @@ bench)
     done
     exit $status
     ;;
+soak)
+    install_missing
+    build --target http_soak_tests
+    # The servers write their ports where the test programs look for them.
+    state=build/mingw/tests/data
+    python3 tests/support/http_server.py start "$state"
+    trap 'python3 tests/support/http_server.py stop "$state"' EXIT
+    KELVRA_SOAK_REQUESTS=${2:-10000} "$wine_run" build/mingw/bin/http_soak_tests.exe
+    ;;
 *)
-    sed -n '2,7p' "$0" | sed 's/^# \{0,1\}//'
+    sed -n '2,9p' "$0" | sed 's/^# \{0,1\}//'
     exit 2
     ;;
 esac

@@ -27,8 +27,8 @@ public:
     // body set, up to five tries. disableAutoRedirect returns a 3xx as the response; otherwise
     // redirects are followed and a GET whose HTML body lacks "</html>" is sent again. True when a
     // response was read, whatever its status (404 included). False with GetLastError: 3 empty
-    // URL, 87 other verb, 8 out of memory (a body of 4 GiB or more included), else the WinHTTP
-    // error; 0 when every send failed. Never throws.
+    // URL, 87 other verb, 8 memory ran out at any stage, reading a header field included (a body
+    // of 4 GiB or more too), else the WinHTTP error; 0 when every send failed. Never throws.
     bool SendHttpRequest(const std::wstring& httpVerb, bool disableAutoRedirect);
 
     // The user agent reaches WinHTTP once, when the first request opens the session.

@@ -37,7 +37,8 @@ class KELVRA_API INIReader
 public:
     // Reads the whole file; the reader holds no file open afterwards. A file that cannot be
     // opened (missing, a folder, no access) gives ParseError() == -1 and an empty table.
-    // Throws std::bad_alloc when the values do not fit in memory.
+    // Throws std::bad_alloc when memory runs out while reading; the file is closed then and
+    // nothing is kept.
     explicit INIReader(const std::wstring& fileName);
     INIReader(const INIReader& other);
     INIReader& operator=(const INIReader& other);
@@ -49,6 +50,7 @@ public:
 
     // The first non-empty value the file gave for section and name, else defaultValue. Section
     // and name match exactly except for the case of A-Z (no trimming, other letters exact).
+    // Look-ups copy strings and, like any std::wstring, may throw std::bad_alloc.
     std::wstring Get(std::wstring section, std::wstring name, std::wstring defaultValue) const;
     // The value read like wcstol in base 0 ("0x1f" hexadecimal, "017" octal, "-7", "12abc" is
     // 12), saturated to the int range; defaultValue when no number starts the value.

@@ -14,6 +14,7 @@
 #include <algorithm>
 #include <climits>
 #include <cwchar>
+#include <new>
 #include <vector>
 
 using KelvraHttp::Platform;
@@ -45,6 +46,17 @@ bool QueryHeaderText(HINTERNET request, DWORD level, DWORD size, std::wstring& t
     answer.resize(std::min<size_t>(std::wcslen(answer.c_str()), std::min(length, size) / sizeof(wchar_t)));
     text.swap(answer);
     return true;
+}
+
+// The values of one of the client's patterns in a header block. These patterns compile, so over
+// a block that is not empty a false from ExtractPatternGroups means that memory ran out: the
+// request then fails rather than go on without the field.
+std::vector<std::wstring> HeaderValues(const wchar_t* pattern, const std::wstring& header)
+{
+    std::vector<std::wstring> values;
+    if (!ExtractPatternGroups(pattern, header, values) && !header.empty())
+        throw std::bad_alloc();
+    return values;
 }
 
 // A Content-Length value; one beyond 32 bits counts as the largest.
@@ -91,19 +103,25 @@ std::uint64_t CWinHttpClient::ReadHeaderBlock(void* request)
         return kNoLength;
 
     using namespace KelvraHeaderPatterns;
-    std::vector<std::wstring> values;
-    if (!forceCharset && ExtractPatternGroups(kCharset, responseHeader, values) && !values.empty())
-        responseCharset = values[0];
-    std::uint64_t announced = kNoLength;
-    if (ExtractPatternGroups(kContentLength, responseHeader, values) && !values.empty())
+    if (!forceCharset)
     {
-        rawResponseContentLength = DecimalLength(values[0]);
+        const std::vector<std::wstring> charsets = HeaderValues(kCharset, responseHeader);
+        if (!charsets.empty())
+            responseCharset = charsets[0];
+    }
+    std::uint64_t announced = kNoLength;
+    const std::vector<std::wstring> lengths = HeaderValues(kContentLength, responseHeader);
+    if (!lengths.empty())
+    {
+        rawResponseContentLength = DecimalLength(lengths[0]);
         announced = rawResponseContentLength;
     }
-    if (ExtractPatternGroups(kLocationValue, responseHeader, values) && !values.empty())
-        responseLocation = values[0];
-    if (ExtractPatternGroups(kCookies, responseHeader, values) && !values.empty())
-        KelvraHttp::AppendCookies(responseCookies, values);
+    const std::vector<std::wstring> locations = HeaderValues(kLocationValue, responseHeader);
+    if (!locations.empty())
+        responseLocation = locations[0];
+    const std::vector<std::wstring> cookies = HeaderValues(kCookies, responseHeader);
+    if (!cookies.empty())
+        KelvraHttp::AppendCookies(responseCookies, cookies);
     return announced;
 }
 

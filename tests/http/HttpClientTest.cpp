@@ -19,30 +19,8 @@ using KelvraHttpTest::ServerUrl;
 namespace
 {
 
-// A trace session for the whole program, in c:\keltrace, which is left as it was found.
-class TraceSession : public testing::Environment
-{
-    void SetUp() override
-    {
-        m_created = std::filesystem::create_directory(KelvraTraceTest::kMarker);
-        Debug::start(L"http_tests", false, false);
-        ASSERT_NE(CLog::_log, nullptr) << "no trace session in c:\\keltrace";
-        KelvraHttpTest::traceLogSeen = KelvraTraceTest::ReadMarkerFile(L"http_tests.log").size();
-    }
-    void TearDown() override
-    {
-        Debug::stop();
-        Debug::lock();
-        std::fclose(CLog::_log);
-        CLog::_log = nullptr;
-        Debug::unlock();
-        std::filesystem::remove(KelvraTraceTest::kMarker / L"http_tests.log");
-        if (m_created)
-            std::filesystem::remove(KelvraTraceTest::kMarker);
-    }
-    bool m_created = false;
-};
-testing::Environment* const traceSession = testing::AddGlobalTestEnvironment(new TraceSession);
+testing::Environment* const traceSession =
+    testing::AddGlobalTestEnvironment(new KelvraHttpTest::TraceSession(L"http_tests"));
 
 std::vector<double> progressReports;
 

@@ -220,26 +220,75 @@ TEST(HttpFaults, EachFailureEndsAsDocumented)
     }
 }
 
-// Whichever platform call fails, the request leaves no handle open and closes none twice.
+// A GET through the user's auto-config script (the binding answers the look-up), a POST through
+// a manual proxy with credentials and a POST through the user's fixed proxy, each with a body,
+// extra headers and cookies so that every stage runs; each once for every platform call its clean
+// run makes, with that call alone failing (12345). A call whose failure fails its stage ends the
+// request through the failure path, which closes what the request opened. Each proxy text is
+// freed once, and the session serves the next request.
 TEST(HttpFaults, AnyPlatformCallFailing)
 {
-    const auto request = []()
+    // The operations whose failure fails the request; a failure of any other is retried or skipped.
+    const std::wstring failsTheRequest = L" Open CrackUrl Connect OpenRequest AddRequestHeaders SetOption "
+                                         L"GetIEProxyConfigForCurrentUser GetProxyForUrl WriteData "
+                                         L"ReceiveResponse QueryDataAvailable ";
+    const std::wstring script = L"http://127.0.0.1:1/p.pac";
+    for (const auto& [method, proxy] :
+         {std::pair{L"GET", script}, std::pair{L"POST", std::wstring(L"manual")},
+          std::pair{L"POST", std::wstring()}})
     {
-        CWinHttpClient client(ServerUrl(L"/respond?body=abc"));
-        client.SetAdditionalRequestHeaders(L"X-A: 1");
-        client.SetAdditionalRequestCookies(L"c=1");
-        SendBody(client);
-        client.SendHttpRequest(L"POST", true);
-    };
-    RecordingWinHttp clean;
-    request();
-    ASSERT_GT(clean.calls.size(), 15u);
-    for (int failing = 1; failing <= static_cast<int>(clean.calls.size()); ++failing)
-    {
-        RecordingWinHttp platform;
-        platform.FailCall(failing, 12345);
-        request();
-        EXPECT_TRUE(platform.open.empty()) << clean.calls[failing - 1];
-        EXPECT_EQ(platform.strayCloses, 0) << clean.calls[failing - 1];
+        KelvraHttpTest::UserProxySettings settings;
+        settings.Set(L"127.0.0.1:8888", L"<local>", proxy == script ? script : L"");
+        std::vector<std::wstring> cleanCalls;
+        for (size_t failing = 0; failing <= cleanCalls.size(); ++failing)
+        {
+            const std::wstring call = failing == 0 ? L"none" : cleanCalls[failing - 1];
+            SCOPED_TRACE(testing::Message() << method << " " << proxy << ", failing: " << call);
+            RecordingWinHttp platform;
+            platform.lookedUpProxy = {L"127.0.0.1:8889", L"*.local"};
+            {
+                CWinHttpClient client(ServerUrl(L"/respond?body=abc"));
+                client.SetAdditionalRequestHeaders(L"X-A: 1");
+                client.SetAdditionalRequestCookies(L"c=1");
+                if (proxy == L"manual")
+                    client.SetProxy(L"127.0.0.1:8888"), client.SetProxyUsername(L"u"),
+                        client.SetProxyPassword(L"p");
+                SendBody(client);
+                if (failing > 0)
+                    platform.FailCall(static_cast<int>(failing), 12345);
+                NewTraceLines();
+                const bool result = client.SendHttpRequest(method, std::wstring(method) == L"POST");
+                const std::vector<std::wstring> trace = NewTraceLines();
+                if (failing == 0)
+                    cleanCalls = platform.calls;
+                const std::wstring op = call.substr(0, call.find(L' '));
+                const bool fails = failsTheRequest.find(L' ' + op + L' ') != std::wstring::npos;
+                EXPECT_EQ(result, !fails);
+                EXPECT_EQ(client.GetLastError(), fails ? 12345u : 0u);
+                // What was opened before the failing call, and only that, is closed.
+                const auto openedBefore = [&](const wchar_t* name)
+                {
+                    const auto at =
+                        std::find_if(cleanCalls.begin(), cleanCalls.end(),
+                                     [&](const std::wstring& c) { return c.rfind(name, 0) == 0; });
+                    return static_cast<size_t>(at - cleanCalls.begin()) + 1 < failing ? 1 : 0;
+                };
+                EXPECT_EQ(std::count(trace.begin(), trace.end(), L"TRC Closing request"),
+                          fails ? openedBefore(L"OpenRequest ") : 1);
+                EXPECT_EQ(std::count(trace.begin(), trace.end(), L"TRC Closing connection"),
+                          fails ? openedBefore(L"Connect ") : 1);
+                EXPECT_EQ(std::count(trace.begin(), trace.end(), L"ERR Last documented error [12345]"),
+                          fails ? 1 : 0);
+                EXPECT_EQ(platform.open.size(), op == L"Open" ? 0u : 1u);
+                platform.ClearFaults();
+                EXPECT_TRUE(client.SendHttpRequest(L"GET", false));
+                EXPECT_EQ(CountCalls(platform.calls, 0, L"Open "), op == L"Open" ? 2u : 1u);
+            }
+            EXPECT_TRUE(platform.open.empty());
+            EXPECT_EQ(platform.strayCloses, 0);
+            EXPECT_TRUE(platform.handedOut.empty());
+            EXPECT_EQ(platform.strayFrees, 0);
+        }
+        EXPECT_GT(cleanCalls.size(), 20u);
     }
 }

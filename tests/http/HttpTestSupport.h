@@ -1,9 +1,10 @@
 // What the HTTP client's tests share: the local servers (tests/support/http_server.py, started by
-// ctest) and the trace log of this program, c:\keltrace\http_tests.log (HttpClientTest.cpp opens it),
-// read with the trace tests' helpers.
+// ctest) and the trace session, c:\keltrace\http_tests.log (HttpClientTest.cpp opens it), read with
+// the trace tests' helpers.
 #pragma once
 
 #include "KelvraStrings.h"
+#include "KelvraTrace.h"
 
 #include "support/TestData.h"
 #include "trace/TraceTestSupport.h"
@@ -11,19 +12,33 @@
 #include <windows.h>
 
 #include <algorithm>
+#include <cstdio>
+#include <filesystem>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace KelvraHttpTest
 {
 
-// "http://127.0.0.1:<port>" or "https://127.0.0.1:<port>" followed by path.
-inline std::wstring ServerUrl(const std::wstring& path, bool secure = false)
+// "http://127.0.0.1:<port>" or "https://127.0.0.1:<port>" followed by path, for the listener whose
+// port stands in portFile.
+inline std::wstring LocalUrl(const wchar_t* portFile, const std::wstring& path, bool secure = false)
 {
-    const std::string port =
-        KelvraTest::ReadBinaryFile(KelvraTest::DataPath(secure ? L"https_server.port" : L"http_server.port"));
+    const std::string port = KelvraTest::ReadBinaryFile(KelvraTest::DataPath(portFile));
     return (secure ? L"https://127.0.0.1:" : L"http://127.0.0.1:") + std::wstring(port.begin(), port.end()) +
            path;
+}
+
+inline std::wstring ServerUrl(const std::wstring& path, bool secure = false)
+{
+    return LocalUrl(secure ? L"https_server.port" : L"http_server.port", path, secure);
+}
+
+// The hostile listener's scripted reply of that name.
+inline std::wstring HostileUrl(const std::wstring& reply)
+{
+    return LocalUrl(L"hostile_server.port", L"/" + reply);
 }
 
 // How much of this program's trace log the tests have seen: the session banner, then what
@@ -41,6 +56,37 @@ inline std::vector<std::wstring> NewTraceLines()
     traceLogSeen = log.size();
     return lines;
 }
+
+// A trace session of the program in c:\keltrace\<name>.log while its tests run; the log is
+// removed at the end, and c:\keltrace left as it was found.
+class TraceSession : public testing::Environment
+{
+public:
+    explicit TraceSession(std::wstring name) : m_name(std::move(name)) {}
+
+    void SetUp() override
+    {
+        m_created = std::filesystem::create_directory(KelvraTraceTest::kMarker);
+        Debug::start(m_name, false, false);
+        ASSERT_NE(CLog::_log, nullptr) << "no trace session in c:\\keltrace";
+        traceLogSeen = KelvraTraceTest::ReadMarkerFile(m_name + L".log").size();
+    }
+    void TearDown() override
+    {
+        Debug::stop();
+        Debug::lock();
+        std::fclose(CLog::_log);
+        CLog::_log = nullptr;
+        Debug::unlock();
+        std::filesystem::remove(KelvraTraceTest::kMarker / (m_name + L".log"));
+        if (m_created)
+            std::filesystem::remove(KelvraTraceTest::kMarker);
+    }
+
+private:
+    std::wstring m_name;
+    bool m_created = false;
+};
 
 // The current user's proxy settings, in the registry value Wine's WinHTTP reads (README): none
 // while the object lives, unless set, then the value found is put back. Holders run under the

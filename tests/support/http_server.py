@@ -19,10 +19,16 @@ Routes (GET or POST; percent-encoded values stand for single bytes):
                            request headers as received, an empty line and the request body
     /big?size=N&chunked=1  N bytes of generated text (KelvraBigBody), with a Content-Length or chunked
     /site                  a sample HTML page of about 4 MiB, sent slowly enough to watch
+
+A third listener, on the port in STATE_DIR/hostile_server.port, answers GET /<name> with the raw
+bytes of the scripted reply of that name in HOSTILE_REPLIES (headers of any size, broken lengths,
+a connection cut short, a reply that stalls), then closes.
 """
 import http.server
 import os
 import signal
+import socket
+import socketserver
 import ssl
 import subprocess
 import sys
@@ -32,6 +38,7 @@ import urllib.parse
 
 PORT_FILE = "http_server.port"
 HTTPS_PORT_FILE = "https_server.port"
+HOSTILE_PORT_FILE = "hostile_server.port"
 PID_FILE = "http_server.pid"
 LOG_FILE = "http_server.log"
 # The generated body: byte i is BLOCK[i % len(BLOCK)], printable ASCII (tests rebuild it).
@@ -55,9 +62,15 @@ def sample_site():
 
 class Handler(http.server.BaseHTTPRequestHandler):
     protocol_version = "HTTP/1.1"
+    # Headers and body leave in separate writes: with Nagle's algorithm the body would wait for
+    # the client's delayed acknowledgement of the headers, some 40 ms a request.
+    disable_nagle_algorithm = True
 
     # A body is read whatever the method: one left unread would reset the connection at its close.
+    # The client holds its body back until its headers are acknowledged (Nagle's algorithm on its
+    # side): acknowledging them at once saves a delayed acknowledgement a request.
     def do_GET(self):
+        self.connection.setsockopt(socket.IPPROTO_TCP, socket.TCP_QUICKACK, 1)
         self.answer(self.rfile.read(int(self.headers.get("Content-Length") or 0)))
 
     do_POST = do_GET
@@ -119,8 +132,54 @@ class Handler(http.server.BaseHTTPRequestHandler):
         sys.stderr.write("%s %s\n" % (self.address_string(), format % args))
 
 
-def listen(state_dir, port_file, tls=None):
-    server = http.server.ThreadingHTTPServer(("127.0.0.1", 0), Handler)
+def hostile_reply(name):
+    """The steps of a scripted reply: bytes to send, or seconds to wait before the next step."""
+    status = b"HTTP/1.1 200 OK\r\n"
+    ending = b"Content-Length: 2\r\n\r\nok"
+    if name == "many-lines":  # a header block of 1 MiB in 2,048 lines
+        return [status + b"".join(b"X-Line-%05d: %s\r\n" % (i, b"v" * 496) for i in range(2048)) + ending]
+    if name == "long-line":  # one header line of 200 KiB
+        return [status + b"X-Long: " + b"a" * 204800 + b"\r\n" + ending]
+    if name == "cookies":
+        return [status + b"".join(b"Set-Cookie: c%05d=%d\r\n" % (i, i) for i in range(20000)) + ending]
+    if name == "huge-length":
+        return [status + b"Content-Length: 99999999999999999999\r\n\r\nshort"]
+    if name == "five-gib":
+        return [status + b"Content-Length: 5368709120\r\n\r\nshort"]
+    if name == "cut-headers":
+        return [status + b"Content-Type: text/pl"]
+    if name == "cut-body":
+        return [status + b"Content-Length: 1000\r\n\r\npartial"]
+    if name == "garbage-status":
+        return [b"\x01\xffGARBAGE STATUS\r\nX-A: 1\r\n\r\nbody"]
+    if name == "stall":  # the headers, then nothing for longer than any test waits
+        return [status + b"Content-Length: 100\r\n\r\n", 4.0]
+    return []  # "empty" and any other name: the connection closes without a byte
+
+
+class HostileHandler(socketserver.BaseRequestHandler):
+    def handle(self):
+        request = b""
+        while b"\r\n\r\n" not in request:
+            data = self.request.recv(65536)
+            if not data:
+                return
+            request += data
+        name = request.split(b" ", 2)[1].decode("latin-1").lstrip("/")
+        for step in hostile_reply(name):
+            if isinstance(step, float):
+                time.sleep(step)
+            else:
+                self.request.sendall(step)
+
+
+class HostileServer(socketserver.ThreadingTCPServer):
+    daemon_threads = True
+
+
+def listen(state_dir, port_file, tls=None, server=None):
+    if server is None:
+        server = http.server.ThreadingHTTPServer(("127.0.0.1", 0), Handler)
     if tls:
         server.socket = tls.wrap_socket(server.socket, server_side=True)
     threading.Thread(target=server.serve_forever, daemon=True).start()
@@ -139,6 +198,7 @@ def serve(state_dir):
     tls = ssl.SSLContext(ssl.PROTOCOL_TLS_SERVER)
     tls.load_cert_chain(certificate, key)
     listen(state_dir, HTTPS_PORT_FILE, tls)
+    listen(state_dir, HOSTILE_PORT_FILE, server=HostileServer(("127.0.0.1", 0), HostileHandler))
     listen(state_dir, PORT_FILE)
     threading.Event().wait()
 
@@ -184,7 +244,7 @@ def stop(state_dir):
         except ProcessLookupError:
             pass
         os.remove(pid_path)
-    for name in (PORT_FILE, HTTPS_PORT_FILE):
+    for name in (PORT_FILE, HTTPS_PORT_FILE, HOSTILE_PORT_FILE):
         if os.path.exists(os.path.join(state_dir, name)):
             os.remove(os.path.join(state_dir, name))
 

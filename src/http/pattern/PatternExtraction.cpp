@@ -41,6 +41,9 @@ bool ExtractPatternGroups(const std::wstring& pattern, const std::wstring& text,
             if (from >= lowered.Length())
                 break;
         }
+        // A match cut short by memory would pass for the end of the matches.
+        if (context.OutOfMemory())
+            throw std::bad_alloc();
     }
     catch (const std::bad_alloc&)
     {

@@ -54,6 +54,7 @@ bool CRegexMatchContext::Prepare(std::uint32_t groupCount, std::uint32_t slotCou
     catch (const std::bad_alloc&)
     {
         m_groupCount = 0;
+        m_outOfMemory = true;
         return false;
     }
     m_groupCount = groupCount;
@@ -73,6 +74,7 @@ bool CRegexMatchContext::Grow(size_t depth)
     }
     catch (const std::bad_alloc&)
     {
+        m_outOfMemory = true;
         return false;
     }
     return true;
@@ -101,6 +103,7 @@ bool CRegexPattern::Match(const wchar_t* text, CRegexMatchContext& context, cons
 {
     if (end != nullptr)
         *end = nullptr;
+    context.m_outOfMemory = false;
     if (text == nullptr)
         return false;
     try
@@ -110,6 +113,7 @@ bool CRegexPattern::Match(const wchar_t* text, CRegexMatchContext& context, cons
     }
     catch (const std::bad_alloc&)
     {
+        context.m_outOfMemory = true;
         return false;
     }
 }
@@ -119,6 +123,7 @@ bool CRegexPattern::Match(const KelvraRegex::LoweredText& text, size_t from, CRe
 {
     if (end != nullptr)
         *end = nullptr;
+    context.m_outOfMemory = false;
     if (m_program.code.empty() || from > text.Length())
         return false;
     if (!context.Prepare(m_program.groupCount, m_program.slotCount, text.Original()))

@@ -51,7 +51,7 @@ public:
     static constexpr size_t kUnlimited = static_cast<size_t>(-1);
 
     // The stack starts with initialStackEntries entries and grows as needed up to stackLimit
-    // entries; a match that needs more ends without a match.
+    // entries; a match that needs more ends without a match. Throws std::bad_alloc.
     explicit CRegexMatchContext(size_t initialStackEntries = 256, size_t stackLimit = kUnlimited);
 
     // A capture as positions in the text last matched: the characters from start up to, not
@@ -71,6 +71,8 @@ public:
     const wchar_t* MatchEnd() const { return At(m_matchEnd); }
     // Entries the backtracking stack holds room for.
     size_t StackSize() const { return m_stack.size(); }
+    // Whether the last match ended because memory ran out, its false saying nothing of the text.
+    bool OutOfMemory() const { return m_outOfMemory; }
 
 private:
     friend class CRegexPattern;
@@ -98,6 +100,7 @@ private:
     std::vector<std::uint64_t> m_stack;
     size_t m_depth = 0;
     size_t m_stackLimit;
+    bool m_outOfMemory = false;
     const wchar_t* m_text = nullptr;
 };
 
@@ -108,15 +111,15 @@ public:
     CRegexPattern() = default;
 
     // Compiles pattern (null reads as empty), replacing any earlier program. Returns 0 or a
-    // compile error code (KelvraRegex::CompileError), also kept as LastError(); after an error
-    // the pattern matches nothing.
+    // compile error code (KelvraRegex::CompileError; 1 when memory runs out), also kept as
+    // LastError(); after an error the pattern matches nothing. Never throws std::bad_alloc.
     int Parse(const wchar_t* pattern);
 
     // Searches text (up to its first NUL) from its start. Returns true on a match; false when
-    // there is none, the pattern is not compiled, text is null, memory runs out or the stack
-    // cannot grow. context then holds the match and captures as positions in text; *end, if
-    // given, is where the matcher stopped (the end of the match on success). Throws
-    // CRegexException(kInvalidArgument) should the program jump outside itself.
+    // there is none, the pattern is not compiled, text is null, memory runs out (then
+    // context.OutOfMemory()) or the stack reaches its limit. Never throws std::bad_alloc. context then holds
+    // the match and captures as positions in text; *end, if given, is where the matcher stopped (the end of
+    // the match on success). Throws CRegexException(kInvalidArgument) should the program jump outside itself.
     bool Match(const wchar_t* text, CRegexMatchContext& context, const wchar_t** end = nullptr) const;
 
     // The same search over a text lowered beforehand, from offset from (at most its length);
