@@ -254,7 +254,7 @@ FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start)
             continue;
         visited[at] = true;
         const Instruction& instruction = code[at];
-        const wchar_t operand = static_cast<wchar_t>(instruction.operand);
+        const auto operand = static_cast<std::uint16_t>(instruction.operand);
         switch (instruction.op)
         {
         case OpCode::Char:
@@ -269,8 +269,8 @@ FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start)
             FirstChars items;
             for (size_t bound = at + 1; bound + 1 < instruction.operand && bound + 1 < code.size();
                  bound += 2)
-                items.AddRange(static_cast<wchar_t>(code[bound].operand),
-                               static_cast<wchar_t>(code[bound + 1].operand));
+                items.AddRange(static_cast<std::uint16_t>(code[bound].operand),
+                               static_cast<std::uint16_t>(code[bound + 1].operand));
             if (instruction.op == OpCode::CharClass)
                 first.Add(items);
             else
@@ -341,7 +341,7 @@ FirstChars FirstChars::Anything()
     return anything;
 }
 
-void FirstChars::AddRange(wchar_t low, wchar_t high)
+void FirstChars::AddRange(std::uint16_t low, std::uint16_t high)
 {
     for (unsigned c = low; c <= high && c < 128; ++c)
         m_ascii[c >> 6] |= std::uint64_t{1} << (c & 63);

@@ -66,7 +66,8 @@ public:
         return m_beyondAscii;
     }
 
-    void AddRange(wchar_t low, wchar_t high);
+    // Units compare as unsigned 16-bit values, as the class instructions compare them.
+    void AddRange(std::uint16_t low, std::uint16_t high);
     void AddAllBut(const FirstChars& excluded);
     void Add(const FirstChars& other);
 
