@@ -109,7 +109,8 @@ public:
 
     // Compiles pattern (null reads as empty), replacing any earlier program. Returns 0 or a
     // compile error code (KelvraRegex::CompileError), also kept as LastError(); after an error
-    // the pattern matches nothing.
+    // the pattern matches nothing. A pattern nested more than 200 deep, or whose program would
+    // pass 16,384 instructions (nested '+' doubles its body's code), gets 1 as if memory ran out.
     int Parse(const wchar_t* pattern);
 
     // Searches text (up to its first NUL) from its start. Returns true on a match; false when

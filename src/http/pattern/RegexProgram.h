@@ -89,7 +89,8 @@ struct Program
     std::vector<FirstChars> branchFirstChars;
 };
 
-// Builds the program of a tree that ParseRegex accepted. Throws std::bad_alloc.
+// Builds the program of a tree that ParseRegex accepted. Throws std::bad_alloc, also for a program
+// beyond 16,384 instructions (each level of nested '+' doubles the code of its body).
 Program BuildProgram(const SyntaxTree& tree);
 
 } // namespace KelvraRegex
