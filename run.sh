@@ -2,7 +2,8 @@
 # Quick start on Debian 12 (as root, or with sudo):
 #   ./run.sh demo [URL]     build the library and run the demo under Wine: it fetches a sample
 #                           site from a local server, or URL, with a progress bar and the trace on
-#   ./run.sh test           build everything and run every test (what CI runs)
+#   ./run.sh test           build everything, run every test, then fuzz 20 s each (what CI runs)
+#   ./run.sh fuzz [seconds] build the native fuzz targets and run each (default 20 s)
 #   ./run.sh bench [name]   build and run the benchmarks (all, or bench/<name>_bench)
 #   ./run.sh soak [count]   build and run the soak of the HTTP client: count requests (10,000)
 #                           against the local servers, printing handles and private memory
@@ -10,7 +11,8 @@
 set -euo pipefail
 cd "$(dirname "$0")"
 
-packages=(cmake ninja-build g++-mingw-w64-x86-64-posix wine wine64 libgnutls30 python3 openssl googletest)
+packages=(cmake ninja-build g++-mingw-w64-x86-64-posix wine wine64 libgnutls30 python3 openssl googletest
+    clang-14 libclang-rt-14-dev)
 
 as_root() {
     if [ "$(id -u)" -eq 0 ]; then "$@"; else sudo "$@"; fi
@@ -35,6 +37,33 @@ build() {
 
 wine_run=build/mingw/wine-run
 
+# Each fuzzer runs for $1 seconds on a fresh copy of its seed corpus (what it finds stays in
+# build/fuzz/run, never in fuzz/corpus). Any crash, broken check, time-out or memory blow-up fails.
+fuzz() {
+    local seconds=$1 status=0 program name work dictionary
+    cmake -S fuzz -B build/fuzz -G Ninja -DCMAKE_CXX_COMPILER=clang++-14 >/dev/null
+    cmake --build build/fuzz
+    for program in build/fuzz/*_fuzz; do
+        name=$(basename "$program" _fuzz)
+        work=build/fuzz/run/$name
+        rm -rf "$work"
+        mkdir -p "$work/corpus" "$work/findings"
+        cp fuzz/corpus/"$name"/* "$work/corpus/"
+        dictionary=()
+        [ -f fuzz/"$name".dict ] && dictionary=(-dict=fuzz/"$name".dict)
+        echo "== $name: $seconds s"
+        if "$program" "${dictionary[@]}" -max_total_time="$seconds" -timeout=10 -rss_limit_mb=2048 \
+            -artifact_prefix="$work/findings/" "$work/corpus" >"$work/log" 2>&1; then
+            grep -E '^#[0-9]+.*DONE|^Done' "$work/log"
+        else
+            tail -n 40 "$work/log"
+            echo "$name: finding in $work/findings" >&2
+            status=1
+        fi
+    done
+    return $status
+}
+
 case "${1:-}" in
 demo)
     install_missing
@@ -55,6 +84,11 @@ demo)
 test)
     install_missing
     cmake --workflow --preset mingw
+    fuzz 20
+    ;;
+fuzz)
+    install_missing
+    fuzz "${2:-20}"
     ;;
 bench)
     install_missing
@@ -78,7 +112,7 @@ soak)
     KELVRA_SOAK_REQUESTS=${2:-10000} "$wine_run" build/mingw/bin/http_soak_tests.exe
     ;;
 *)
-    sed -n '2,9p' "$0" | sed 's/^# \{0,1\}//'
+    sed -n '2,10p' "$0" | sed 's/^# \{0,1\}//'
     exit 2
     ;;
 esac

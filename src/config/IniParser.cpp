@@ -57,17 +57,28 @@ bool CopyName(wchar_t (&target)[kNameSize], const wchar_t* name)
     return true;
 }
 
-// After a read that filled the buffer without reaching a line end: whether the physical line
-// has more characters. A line end that just missed the buffer is left for the next read, which
-// then counts as a line of its own.
-bool LineGoesOn(std::FILE* stream)
+// A text-mode file, read by the runtime: each byte one character, CR LF as LF.
+class FileLineReader : public IniLineReader
 {
-    const wint_t next = std::fgetwc(stream);
-    if (next == WEOF)
-        return false;
-    std::ungetwc(next, stream);
-    return next != L'\n';
-}
+public:
+    explicit FileLineReader(std::FILE* stream) : m_stream(stream) {}
+
+    bool ReadLine(wchar_t* buffer, int size) override
+    {
+        return std::fgetws(buffer, size, m_stream) != nullptr;
+    }
+
+    std::wint_t Peek() override
+    {
+        const std::wint_t next = std::fgetwc(m_stream);
+        if (next != WEOF)
+            std::ungetwc(next, m_stream);
+        return next;
+    }
+
+private:
+    std::FILE* m_stream;
+};
 
 enum class Piece
 {
@@ -90,45 +101,54 @@ class Parser
 public:
     Parser(IniHandler handler, void* user) : m_handler(handler), m_user(user) {}
 
-    int Run(std::FILE* stream)
+    int Run(IniLineReader& lines)
     {
         wchar_t line[kLineSize];
         for (;;)
         {
-            const Piece piece = Read(stream, line);
+            const Piece piece = Read(lines, line);
             if (piece == Piece::End)
                 return m_firstError;
             const int lineNumber = m_lineNumber;
             const Rest rest =
-                piece == Piece::Cut ? SkipRest(stream, IsSpace(line[kLineSize - 2])) : Rest::None;
+                piece == Piece::Cut ? SkipRest(lines, IsSpace(line[kLineSize - 2])) : Rest::None;
             if (!ParseLine(line, lineNumber == 1, rest) && m_firstError == 0)
                 m_firstError = lineNumber;
         }
     }
 
 private:
-    // Reads at most 199 characters of the stream, which count as one line.
-    Piece Read(std::FILE* stream, wchar_t (&piece)[kLineSize])
+    // Reads at most 199 characters, which count as one line.
+    Piece Read(IniLineReader& lines, wchar_t (&piece)[kLineSize])
     {
         // fgetws writes its terminating NUL into the last slot only when a read fills the
         // buffer; the line itself may hold NUL characters, so its length cannot tell.
         piece[kLineSize - 1] = L'\x1';
-        if (std::fgetws(piece, kLineSize, stream) == nullptr)
+        if (!lines.ReadLine(piece, kLineSize))
             return Piece::End;
         if (m_lineNumber < INT_MAX)
             ++m_lineNumber;
         const bool filled = piece[kLineSize - 1] == L'\0' && piece[kLineSize - 2] != L'\n';
-        return filled && LineGoesOn(stream) ? Piece::Cut : Piece::Whole;
+        return filled && LineGoesOn(lines) ? Piece::Cut : Piece::Whole;
+    }
+
+    // After a read that filled the buffer without reaching a line end: whether the physical line
+    // has more characters. A line end that just missed the buffer is left for the next read,
+    // which then counts as a line of its own.
+    static bool LineGoesOn(IniLineReader& lines)
+    {
+        const std::wint_t next = lines.Peek();
+        return next != WEOF && next != L'\n';
     }
 
     // Reads the rest of a cut line and tells what it holds. afterSpace: the first read ended in
     // white space, so that a ';' right at the start of the rest opens an inline comment.
-    Rest SkipRest(std::FILE* stream, bool afterSpace)
+    Rest SkipRest(IniLineReader& lines, bool afterSpace)
     {
         wchar_t piece[kLineSize];
         Rest rest = Rest::Blank;
         Piece read = Piece::Cut;
-        while (read == Piece::Cut && (read = Read(stream, piece)) != Piece::End)
+        while (read == Piece::Cut && (read = Read(lines, piece)) != Piece::End)
         {
             for (const wchar_t* c = piece; rest == Rest::Blank && *c != L'\0'; ++c)
             {
@@ -243,9 +263,15 @@ private:
 
 } // namespace
 
+int ParseIniLines(IniLineReader& lines, IniHandler handler, void* user)
+{
+    return Parser(handler, user).Run(lines);
+}
+
 int ParseIniStream(std::FILE* stream, IniHandler handler, void* user)
 {
-    return Parser(handler, user).Run(stream);
+    FileLineReader lines(stream);
+    return ParseIniLines(lines, handler, user);
 }
 
 } // namespace Kelvra

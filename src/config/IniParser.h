@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdio>
+#include <cwchar>
 
 namespace Kelvra
 {
@@ -33,5 +34,21 @@ using IniHandler = int (*)(void* user, const wchar_t* section, const wchar_t* na
 //   dropped. A refused header leaves no known section: the lines up to the next good header
 //   are dropped (the header's line is the error).
 int ParseIniStream(std::FILE* stream, IniHandler handler, void* user);
+
+// Where the parser's text comes from: ParseIniStream reads a file with the runtime's wide line
+// reader; the native fuzzing build, which has no such file, reads memory.
+class IniLineReader
+{
+public:
+    virtual ~IniLineReader() = default;
+    // Reads as fgetws does: up to and including the first line end, at most size - 1 characters,
+    // then a NUL. False when nothing is left or the read fails.
+    virtual bool ReadLine(wchar_t* buffer, int size) = 0;
+    // The next character, left unread; WEOF when nothing is left.
+    virtual std::wint_t Peek() = 0;
+};
+
+// ParseIniStream over the reads of any reader.
+int ParseIniLines(IniLineReader& lines, IniHandler handler, void* user);
 
 } // namespace Kelvra

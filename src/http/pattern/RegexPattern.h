@@ -111,8 +111,10 @@ public:
     CRegexPattern() = default;
 
     // Compiles pattern (null reads as empty), replacing any earlier program. Returns 0 or a
-    // compile error code (KelvraRegex::CompileError; 1 when memory runs out), also kept as
-    // LastError(); after an error the pattern matches nothing. Never throws std::bad_alloc.
+    // compile error code (KelvraRegex::CompileError), also kept as LastError(); after an error
+    // the pattern matches nothing. Never throws std::bad_alloc: memory running out, a pattern
+    // nested more than 200 deep, or a program that would pass 16,384 instructions (nested '+'
+    // doubles its body's code) gets 1.
     int Parse(const wchar_t* pattern);
 
     // Searches text (up to its first NUL) from its start. Returns true on a match; false when

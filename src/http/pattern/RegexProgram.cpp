@@ -2,12 +2,23 @@
 
 #include <algorithm>
 #include <cassert>
+#include <new>
 
 namespace KelvraRegex
 {
 
 namespace
 {
+
+// Each level of nested '+' doubles the code of its body (x+ is x, then x* over a second copy of
+// x), so that a pattern of 60 characters could ask for millions of instructions. A program beyond
+// this size is refused as if memory ran out, like a pattern nested too deep.
+constexpr size_t kMaxInstructions = 1 << 14;
+
+// How many instructions the first-character search of one Branch visits before it gives up and
+// admits everything: the answer only saves work, and without a bound a program of many choices
+// would take time in the square of its size to build.
+constexpr size_t kFirstCharsReach = 1024;
 
 // Emits the code templates of each construct. Indices in comments are relative to the first
 // instruction of the construct; "after" is the index just past its code.
@@ -30,6 +41,8 @@ private:
 
     size_t Add(OpCode op, std::uint64_t operand = 0)
     {
+        if (m_program.code.size() >= kMaxInstructions)
+            throw std::bad_alloc();
         m_program.code.push_back(Instruction{op, operand});
         return m_program.code.size() - 1;
     }
@@ -239,10 +252,12 @@ void Builder::EmitLazyLoop(const Node& body)
 // followed; both ways of a Branch count, since by the rule of the templates its resume point
 // fails or restores the position the Branch saw. Anything that can succeed, or restore a position,
 // without consuming (Accept, a look-ahead, a back-reference) makes the answer Anything.
-FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start)
+// visitedBy holds, for each instruction, the last search that visited it; search names this one.
+FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start, std::vector<size_t>& visitedBy,
+                          size_t search)
 {
     FirstChars first;
-    std::vector<bool> visited(code.size(), false);
+    size_t visits = 0;
     std::vector<size_t> pending{start};
     while (!pending.empty())
     {
@@ -250,11 +265,13 @@ FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start)
         pending.pop_back();
         if (at >= code.size())
             return FirstChars::Anything();
-        if (visited[at])
+        if (visitedBy[at] == search)
             continue;
-        visited[at] = true;
+        if (++visits > kFirstCharsReach)
+            return FirstChars::Anything();
+        visitedBy[at] = search;
         const Instruction& instruction = code[at];
-        const wchar_t operand = static_cast<wchar_t>(instruction.operand);
+        const auto operand = static_cast<std::uint16_t>(instruction.operand);
         switch (instruction.op)
         {
         case OpCode::Char:
@@ -269,8 +286,8 @@ FirstChars FirstCharsFrom(const std::vector<Instruction>& code, size_t start)
             FirstChars items;
             for (size_t bound = at + 1; bound + 1 < instruction.operand && bound + 1 < code.size();
                  bound += 2)
-                items.AddRange(static_cast<wchar_t>(code[bound].operand),
-                               static_cast<wchar_t>(code[bound + 1].operand));
+                items.AddRange(static_cast<std::uint16_t>(code[bound].operand),
+                               static_cast<std::uint16_t>(code[bound + 1].operand));
             if (instruction.op == OpCode::CharClass)
                 first.Add(items);
             else
@@ -341,7 +358,7 @@ FirstChars FirstChars::Anything()
     return anything;
 }
 
-void FirstChars::AddRange(wchar_t low, wchar_t high)
+void FirstChars::AddRange(std::uint16_t low, std::uint16_t high)
 {
     for (unsigned c = low; c <= high && c < 128; ++c)
         m_ascii[c >> 6] |= std::uint64_t{1} << (c & 63);
@@ -385,11 +402,12 @@ Program BuildProgram(const SyntaxTree& tree)
     const bool backReferences =
         std::any_of(program.code.begin(), program.code.end(),
                     [](const Instruction& instruction) { return instruction.op == OpCode::BackRef; });
+    std::vector<size_t> visitedBy(program.code.size(), program.code.size());
     for (size_t at = 0; at < program.code.size() && !backReferences; ++at)
     {
         if (program.code[at].op == OpCode::Branch)
             program.branchFirstChars[at] =
-                FirstCharsFrom(program.code, static_cast<size_t>(program.code[at].operand));
+                FirstCharsFrom(program.code, static_cast<size_t>(program.code[at].operand), visitedBy, at);
     }
     return program;
 }

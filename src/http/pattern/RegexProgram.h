@@ -66,7 +66,8 @@ public:
         return m_beyondAscii;
     }
 
-    void AddRange(wchar_t low, wchar_t high);
+    // Units compare as unsigned 16-bit values, as the class instructions compare them.
+    void AddRange(std::uint16_t low, std::uint16_t high);
     void AddAllBut(const FirstChars& excluded);
     void Add(const FirstChars& other);
 
@@ -88,7 +89,8 @@ struct Program
     std::vector<FirstChars> branchFirstChars;
 };
 
-// Builds the program of a tree that ParseRegex accepted. Throws std::bad_alloc.
+// Builds the program of a tree that ParseRegex accepted. Throws std::bad_alloc, also for a program
+// beyond 16,384 instructions (each level of nested '+' doubles the code of its body).
 Program BuildProgram(const SyntaxTree& tree);
 
 } // namespace KelvraRegex

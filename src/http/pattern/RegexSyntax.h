@@ -13,7 +13,7 @@ namespace KelvraRegex
 enum CompileError : int
 {
     kCompiled = 0,
-    kOutOfMemory = 1,
+    kOutOfMemory = 1,      // also for a pattern nested too deep or a program too large
     kCaptureNotClosed = 2, // '}' expected
     kGroupNotClosed = 3,   // ')' expected
     kClassNotClosed = 4,   // ']' expected, or a range without its high end

@@ -121,6 +121,25 @@ TEST(RegexSafety, DeepNestingIsRefused)
     EXPECT_EQ(pattern.Parse((std::wstring(50, L'(') + L"a" + std::wstring(50, L')')).c_str()), 0);
 }
 
+TEST(RegexSafety, NestedPlusBeyondTheProgramLimitIsRefused)
+{
+    // "x+" is x followed by a loop over a second copy of x: each level of "(...)+" doubles the
+    // code. Found by fuzzing: 16 levels compiled to 65,535 loops, 18 levels took seconds.
+    const auto nestedPlus = [](int levels)
+    {
+        std::wstring nested = std::wstring(levels, L'(') + L"a";
+        for (int level = 0; level < levels; ++level)
+            nested += L")+";
+        return nested;
+    };
+    CRegexPattern pattern;
+    EXPECT_EQ(pattern.Parse(nestedPlus(16).c_str()), 1);
+    ASSERT_EQ(pattern.Parse(nestedPlus(8).c_str()), 0);
+    CRegexMatchContext context;
+    ASSERT_TRUE(pattern.Match(L"baab", context));
+    EXPECT_EQ(std::wstring(context.MatchStart(), context.MatchEnd()), L"aa");
+}
+
 TEST(RegexSafety, TextEndsAtItsFirstNul)
 {
     ExpectExtractions({
