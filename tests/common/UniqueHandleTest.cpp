@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <optional>
 #include <vector>
 
 namespace
@@ -16,63 +17,32 @@ struct RecordingTraits
     static void close(pointer value) noexcept { g_closed.push_back(value); }
 };
 
-using Recorded = Kelvra::UniqueHandle<RecordingTraits>;
-
-class UniqueHandle : public testing::Test
-{
-protected:
-    void SetUp() override { g_closed.clear(); }
-};
-
 } // namespace
 
-TEST_F(UniqueHandle, ClosesOnceWhenDestroyed)
+TEST(UniqueHandle, ClosesEachValueOnceAndNeverOneHandedOn)
 {
-    {
-        Recorded handle(7);
-        EXPECT_TRUE(handle);
-    }
-    EXPECT_EQ(g_closed, std::vector<int>{7});
-}
-
-TEST_F(UniqueHandle, MoveHandsOverWithoutClosing)
-{
+    using Recorded = Kelvra::UniqueHandle<RecordingTraits>;
+    g_closed.clear();
     {
         Recorded first(1);
-        Recorded second(std::move(first));
-        EXPECT_FALSE(first);
-        EXPECT_EQ(second.get(), 1);
+        Recorded second(std::move(first)); // a moved or released value is not closed again
         Recorded third(3);
         third = std::move(second); // closes 3, takes 1
-        EXPECT_EQ(g_closed, std::vector<int>{3});
+        third.reset(4);            // closes 1
+        *third.put() = 5;          // closes 4
+        EXPECT_EQ(third.release(), 5);
+        Recorded last(6);
     }
-    EXPECT_EQ(g_closed, (std::vector<int>{3, 1}));
+    EXPECT_EQ(g_closed, (std::vector<int>{3, 1, 4, 6}));
 }
 
-TEST_F(UniqueHandle, ResetPutAndRelease)
+TEST(UniqueHandle, ClosesARealKernelHandle)
 {
-    Recorded handle(1);
-    handle.reset(2);
-    EXPECT_EQ(g_closed, std::vector<int>{1});
-    *handle.put() = 4;
-    EXPECT_EQ(g_closed, (std::vector<int>{1, 2}));
-    EXPECT_EQ(handle.release(), 4);
-    EXPECT_FALSE(handle);
-    handle.reset();
-    EXPECT_EQ(g_closed, (std::vector<int>{1, 2}));
-}
-
-TEST_F(UniqueHandle, ClosesARealKernelHandle)
-{
-    HANDLE raw = nullptr;
-    {
-        Kelvra::UniqueEvent event(::CreateEventW(nullptr, TRUE, FALSE, nullptr));
-        ASSERT_TRUE(event);
-        raw = event.get();
-        DWORD flags = 0;
-        EXPECT_TRUE(::GetHandleInformation(raw, &flags));
-    }
+    std::optional<Kelvra::UniqueEvent> event(std::in_place, ::CreateEventW(nullptr, TRUE, FALSE, nullptr));
+    const HANDLE raw = event->get();
     DWORD flags = 0;
+    ASSERT_TRUE(::GetHandleInformation(raw, &flags));
+    event.reset();
     EXPECT_FALSE(::GetHandleInformation(raw, &flags));
     EXPECT_EQ(::GetLastError(), static_cast<DWORD>(ERROR_INVALID_HANDLE));
 }
