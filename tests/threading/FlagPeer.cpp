@@ -1,6 +1,5 @@
-// Second process for the named-flag test: threading_flag_peer.exe <name>
-// Finds the flag of that name set by the test and clears it, for the test to see. Exit code: 0 done,
-// 1 bad usage, 2 the flag was clear here.
+// Second process for the named-flag test: threading_flag_peer.exe <name> clears the flag of that
+// name, which the test has set. Exit code: 0 done, 1 bad usage, 2 the flag was clear here.
 #include "KelvraThread.h"
 
 #include <string>
@@ -11,8 +10,7 @@ int main(int argc, char** argv)
         return 1;
     const std::string name(argv[1]);
     KelvraCsThread::CGlobalBooleanFx2 flag(std::wstring(name.begin(), name.end()).c_str());
-    if (!flag)
-        return 2;
+    const bool wasSet = flag;
     flag = false;
-    return 0;
+    return wasSet ? 0 : 2;
 }
