@@ -236,7 +236,7 @@ FAULTS = [
           "Repeated entries compared in their own case, so case variants repeat",
           "src/http/pattern/PatternExtraction.cpp",
           "seen.emplace(lowered.Lowered() + offset, count).second",
-          "seen.emplace(capture.start, count).second"),
+          "seen.emplace(lowered.Original() + offset, count).second"),
     Fault("headers.trimchars-drops-last", "headers", "TrimChars drops the last kept character",
           "src/http/pattern/PatternExtraction.cpp",
           "return text.substr(first, last - first + 1);",
