@@ -43,10 +43,15 @@ inline void ExpectMatches(const std::vector<MatchRow>& rows)
         std::packaged_task<bool()> task([=, text = text]
                                         { return compiled->Match(text, *context, end.get()); });
         std::future<bool> matched = task.get_future();
-        std::thread(std::move(task)).detach();
+        std::thread worker(std::move(task));
         // Generous: on a loaded machine a new thread can wait seconds for its first turn.
-        ASSERT_EQ(matched.wait_for(std::chrono::seconds(30)), std::future_status::ready)
-            << "the match does not end";
+        if (matched.wait_for(std::chrono::seconds(30)) != std::future_status::ready)
+        {
+            worker.detach();
+            FAIL() << "the match does not end";
+        }
+        // Joined, so that no thread of a finished row is still ending when the program exits.
+        worker.join();
         EXPECT_LT(context->StackSize(), kStackLimit) << "the match ran away";
         const wchar_t* const textEnd = text + std::wcslen(text);
         std::wstring found = L"none";
