@@ -30,7 +30,8 @@ bool WithinBacktrackingLimit(const std::wstring& pattern, size_t text)
         if (std::wcschr(L"*+?|\\", pattern[i]) == nullptr)
             continue;
         ++choices;
-        nested = nested || (i > 0 && pattern[i] != L'|' && std::wcschr(L")}nqwz", pattern[i - 1]) != nullptr);
+        // The matcher ignores case: "\W" is the word loop "\w".
+        nested = nested || (i > 0 && pattern[i] != L'|' && std::wcschr(L")}nqwzNQWZ", pattern[i - 1]) != nullptr);
     }
     const double steps = 1e7;
     return std::pow(text + 1.0, choices + 1) <= steps && (!nested || std::pow(choices + 1, text) <= steps);

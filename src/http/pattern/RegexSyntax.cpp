@@ -24,8 +24,8 @@ const wchar_t* const kAbbreviations[] = {
     L"z([0-9]+)",
 };
 
-// Groups, look-aheads, abbreviations and alternatives nest by recursion here, in the program
-// builder and in the tests' interpreter; a deeper pattern is refused as if memory ran out.
+// Groups, look-aheads, abbreviations and alternatives nest by recursion here and in the program
+// builder; a deeper pattern is refused as if memory ran out.
 const int kMaxNesting = 200;
 
 const wchar_t* FindAbbreviation(wchar_t letter)
