@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <windows.h>
+
 #include <atomic>
 #include <cstdlib>
 #include <new>
@@ -61,4 +63,30 @@ TEST(Bytes, SharersKeepTheBlockUntilTheLastGoes)
     EXPECT_EQ(static_cast<char*>(target), block);
     target = Bytes(1);
     EXPECT_EQ(g_liveBlocks, baseline + 1);
+}
+
+TEST(Bytes, SharersOnManyThreadsReleaseTheBlockOnce)
+{
+    const long baseline = g_liveBlocks;
+    {
+        // Plain Win32 threads: std::thread would add allocations of its own to the count.
+        const auto copyAndAssign = [](void* shared) -> DWORD
+        {
+            for (int i = 0; i < 20000; ++i)
+            {
+                Bytes other(1);
+                other = *static_cast<const Bytes*>(shared);
+            }
+            return 0;
+        };
+        Bytes shared(64);
+        HANDLE threads[8];
+        for (HANDLE& thread : threads)
+            thread = ::CreateThread(nullptr, 0, copyAndAssign, &shared, 0, nullptr);
+        ::WaitForMultipleObjects(8, threads, TRUE, INFINITE);
+        for (HANDLE thread : threads)
+            ::CloseHandle(thread);
+        EXPECT_EQ(g_liveBlocks, baseline + 1);
+    }
+    EXPECT_EQ(g_liveBlocks, baseline);
 }

@@ -2,6 +2,9 @@
 
 #include <gtest/gtest.h>
 
+#include <windows.h>
+
+#include <algorithm>
 #include <climits>
 #include <stdexcept>
 #include <tuple>
@@ -73,6 +76,21 @@ TEST(StringsHexToInt, ReadsUpToEightDigitsFromTheRight)
         EXPECT_EQ(output, expected);
     }
     EXPECT_EQ(Strings::HexToInt(L"ff", nullptr), 1);
+}
+
+TEST(StringsHexToInt, NeverReadsBeyondTheNinthCharacter)
+{
+    // Nine digits and no terminator, right before a page that may not be touched.
+    char* const pages =
+        static_cast<char*>(::VirtualAlloc(nullptr, 0x20000, MEM_COMMIT | MEM_RESERVE, PAGE_READWRITE));
+    ASSERT_NE(pages, nullptr);
+    DWORD old;
+    ASSERT_TRUE(::VirtualProtect(pages + 0x10000, 0x10000, PAGE_NOACCESS, &old));
+    wchar_t* const text = reinterpret_cast<wchar_t*>(pages + 0x10000) - 9;
+    std::fill(text, text + 9, L'f');
+    unsigned long output = 0xDEAD;
+    EXPECT_EQ(Strings::HexToInt(text, &output), 2);
+    ::VirtualFree(pages, 0, MEM_RELEASE);
 }
 
 TEST(StringsSplit, SplitsAtEveryOccurrence)

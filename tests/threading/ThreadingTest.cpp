@@ -121,6 +121,24 @@ TEST(FlagWait, TimesOutOnAClearFlagAndNegativeWaitsUntilAnotherThreadSetsIt)
     setter.join();
 }
 
+TEST(NamedFlag, NameOfAnotherKindOfObjectGivesAFlagWithoutEvent)
+{
+    const std::wstring name = L"Kelvra.Threading.Mutex." + std::to_wstring(::GetCurrentProcessId());
+    const Kelvra::UniqueMutex mutex(::CreateMutexW(nullptr, FALSE, name.c_str()));
+    ASSERT_TRUE(mutex);
+    CGlobalBooleanFx2 flag(name.c_str());
+    EXPECT_EQ(static_cast<DWORD>(ERROR_INVALID_HANDLE), ::GetLastError());
+    EXPECT_EQ(nullptr, flag.GetEvent());
+    flag = true;
+    EXPECT_FALSE(flag);
+    EXPECT_FALSE(flag.Wait(-1)) << "a wait without an event must not block";
+}
+
+TEST(ScopeLock, NullLockHoldsNothing)
+{
+    CScopeLock nothing(nullptr);
+}
+
 TEST(NamedFlag, ObjectsOfOneNameShareTheValueAcrossProcesses)
 {
     const std::wstring name = L"Kelvra.Threading." + std::to_wstring(::GetCurrentProcessId());
@@ -270,6 +288,13 @@ TEST_F(ThreadWin32, StopFromInsideRunEndsTheWorker)
     worker.StartAndWait();
     EXPECT_EQ(0xA5A5A5A5u, probe.ExitCode());
     EXPECT_FALSE(worker.IsRunning());
+}
+
+TEST_F(ThreadWin32, DestroyingRightAfterCreateIsSafe)
+{
+    // The derived part may be gone before the new thread reaches Run: the base class answers it.
+    for (int cycle = 0; cycle < 20; ++cycle)
+        Worker(probe, &Cooperate).Create();
 }
 
 TEST_F(ThreadWin32, DestroyingAWorkerThatIgnoresTheRequestTakesAboutFiveSeconds)
