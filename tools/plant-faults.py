@@ -178,7 +178,7 @@ FAULTS = [
     Fault("trace.last-error-not-restored", "trace", "Emitting a line clears the last error instead of restoring it",
           "src/trace/Debug.cpp",
           "    ::SetLastError(lastError);\n",
-          "    ::SetLastError(ERROR_SUCCESS);\n"),
+          "    ::SetLastError(lastError & 0);\n"),
     Fault("trace.cache-ignores-names", "trace",
           "Dropped-line cache not invalidated when the list's names change in place",
           "src/trace/ModuleFilterCache.cpp",

@@ -1,5 +1,4 @@
-// Sample.Net.dll: a second module of the host process that writes its own trace lines through the
-// public macros. Built with a host's default compiler settings, like any user's DLL.
+// Sample.Net.dll: a second module of the host process, tracing through the public macros.
 #include <Kelvra.h>
 
 extern "C" __declspec(dllexport) void SampleTrace(char level, const wchar_t* text)

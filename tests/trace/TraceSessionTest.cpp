@@ -1,187 +1,154 @@
-// Log sessions in fresh helper processes (TraceChild.exe with Sample.Net.dll): the marker
-// directory, file names, append and truncate, the banner, sharing between processes,
-// process-name failures, the exit notice, and the configuration file c:\keltrace\debug with the
-// module filter across the host program (TraceChild) and its DLL (Sample.Net).
-#include "TraceTestSupport.h"
+// Log sessions of this test program, and of fresh host processes (TraceChild.exe with Sample.Net.dll)
+// for what a process does once: read the configuration file c:\keltrace\debug, find its own name.
+#include "KelvraTrace.h"
 
+#include "TraceTestSupport.h"
 #include "common/UniqueHandle.h"
 
-#include <algorithm>
-#include <cstring>
-#include <future>
-#include <tuple>
+#include <gmock/gmock.h>
+
+#include <process.h>
+#include <share.h>
+#include <windows.h>
+
+#include <cstdio>
+#include <utility>
 
 using namespace KelvraTraceTest;
 
 namespace
 {
 
-const char kExitNotice[] = "TO ELIMINATE THE ABOVE FALSE MEMORY LEAKS PLEASE CALL Debug::stop()\n";
-
-using TraceSession = MarkerDirectoryTest;
-using TraceConfigured = MarkerDirectoryTest;
+// Starts in an empty c:\keltrace (no configuration file for this process: level 0, every module),
+// removed afterwards; a session of this program ends with the test.
+class TraceSession : public testing::Test
+{
+protected:
+    void SetUp() override
+    {
+        std::filesystem::remove_all(kMarker);
+        ASSERT_TRUE(std::filesystem::create_directory(kMarker));
+    }
+    void TearDown() override
+    {
+        Debug::stop();
+        Close();
+        std::filesystem::remove_all(kMarker);
+    }
+    static void Close() { Kelvra::UniqueFile(std::exchange(CLog::_log, nullptr)); }
+    static Lines Written(const std::wstring& file)
+    {
+        Close();
+        return SessionLines(ReadMarkerFile(file), "trace_tests");
+    }
+};
 
 } // namespace
 
 TEST(TraceSessionMarker, WithoutTheMarkerDirectoryNothingHappens)
 {
     std::filesystem::remove_all(kMarker);
-    const ChildResult run = RunChild({"start:net:1:0", "start:net:0:1", "trc:dropped", "session"});
-    EXPECT_EQ(run.output, (Lines{"start:ok", "start:ok", "session:closed"}));
+    Debug::start(L"net", true, false);
+    EXPECT_EQ(CLog::_log, nullptr);
     EXPECT_FALSE(std::filesystem::exists(kMarker));
 }
 
-TEST_F(TraceSession, AppendsBannerAndLinesToTheFixedFile)
+TEST_F(TraceSession, AppendsBannerAndLinesToTheFirstStartsFile)
 {
-    const std::string earlier = "old line\r\n";
-    WriteMarkerFile(L"net.log", earlier);
-    const ChildResult run = RunChild({"start:net:1:0", "lasterror", "trc:first", "inf:second", "format",
-                                      "start:other:0:1", "trc:after the second start", "session"});
-    // The first line read the (missing) configuration file, which set the error codes: the
-    // caller still sees its own.
-    EXPECT_EQ(run.output, (Lines{"start:ok", "lasterror:42 errno 33", "start:ok", "session:open"}));
-
-    // Only the first session's file, with one banner; no probe file left behind.
-    EXPECT_EQ(MarkerFiles(), std::vector<std::wstring>{L"net.log"});
-    const std::string text = ReadMarkerFile(L"net.log");
-    ASSERT_EQ(text.compare(0, earlier.size(), earlier), 0) << text;
-    EXPECT_EQ(SessionLines(text.substr(earlier.size())),
-              (Lines{"ERR between setting and reading the error codes", "TRC host first", "INF host second",
-                     // Microsoft rules in a host built with C99 printf, in the "C" locale
-                     "INF wide w\xe9? narrow n number -42", "TRC host after the second start"}));
-}
-
-TEST_F(TraceSession, PerProcessFileCarriesProcessNameAndId)
-{
-    const ChildResult run = RunChild({"start:net:1:1", "trc:mine"});
-    EXPECT_EQ(run.output, Lines{"start:ok"});
-    const std::wstring name = L"tracechild." + std::to_wstring(run.processId) + L".net.log";
-    ASSERT_EQ(MarkerFiles(), std::vector<std::wstring>{name});
-    EXPECT_EQ(SessionLines(ReadMarkerFile(name)), Lines{"TRC host mine"});
+    const std::wstring file = L"trace_tests." + std::to_wstring(::_getpid()) + L".net.log";
+    WriteMarkerFile(file, "old line\r\n");
+    Debug::start(L"net", true, true);
+    ::SetLastError(12345);
+    errno = 7;
+    const int line = __LINE__ + 1;
+    KELVRA_TRC(L"wide %s number %d narrow %hs", L"w\u00e9\u4e2d", -5, "n");
+    EXPECT_EQ(::GetLastError(), 12345u);
+    EXPECT_EQ(errno, 7);
+    Debug::start(L"other", false, false);
+    KELVRA_INF("narrow literal %s", L"too");
+    Debug::emit(&__ImageBase, Debug::lvlError, L"[ERR]", nullptr, -1, nullptr); // null texts count as empty
+    Close();
+    // One file, the first start's, with one banner; no probe file left behind.
+    EXPECT_EQ(std::distance(std::filesystem::directory_iterator(kMarker), {}), 1);
+    const std::string text = ReadMarkerFile(file);
+    ASSERT_EQ(text.rfind("old line\r\n", 0), 0u) << text;
+    EXPECT_NE(text.find("][TraceSessionTest.cpp:" + std::to_string(line) + "] wide"), std::string::npos);
+    // Microsoft format rules; the "C" locale writes U+00E9 as one byte and nothing beyond U+00FF.
+    EXPECT_EQ(SessionLines(text.substr(10), "trace_tests"),
+              (Lines{"TRC wide w\xe9? number -5 narrow n", "INF narrow literal too", "ERR "}));
 }
 
 TEST_F(TraceSession, TruncatingSessionKeepsOtherWritersOut)
 {
     WriteMarkerFile(L"shared.log", "content of an earlier run\r\n");
-    const Kelvra::UniqueEvent ready(::CreateEventW(nullptr, TRUE, FALSE, L"KelvraTraceTestReady"));
-    const Kelvra::UniqueEvent release(::CreateEventW(nullptr, TRUE, FALSE, L"KelvraTraceTestRelease"));
-    const Lines holding = {"start:shared:0:0", "trc:holder", "signal:KelvraTraceTestReady",
-                           "wait:KelvraTraceTestRelease", "trc:holder again"};
-    std::future<ChildResult> holder =
-        std::async(std::launch::async, RunChild, holding, false, L"TraceChild.exe");
-    ASSERT_EQ(::WaitForSingleObject(ready.get(), 60000), WAIT_OBJECT_0);
+    Debug::start(L"shared", false, false);
+    KELVRA_TRC(L"holder");
+    // Whatever their own mode, other writers cannot open the file now, another session included.
+    EXPECT_FALSE(Kelvra::UniqueFile(::_wfsopen(L"c:\\keltrace\\shared.log", L"a", _SH_DENYNO)));
+    std::FILE* const holder = std::exchange(CLog::_log, nullptr);
+    EXPECT_THAT([] { Debug::start(L"shared", true, false); },
+                testing::ThrowsMessage<std::runtime_error>("Debug::setFile fopen failed"));
+    Close(); // what a start that failed to refuse opened, so that later tests find c:\keltrace free
+    CLog::_log = holder;
+    EXPECT_EQ(Written(L"shared.log"), Lines{"TRC holder"});
+}
 
-    // Whatever their own mode, other processes cannot open the file for writing now.
-    const Lines refused = {"start:Debug::setFile fopen failed", "session:closed"};
-    EXPECT_EQ(RunChild({"start:shared:1:0", "trc:lost", "session"}).output, refused);
-    EXPECT_EQ(RunChild({"start:shared:0:0", "session"}).output, refused);
-    ::SetEvent(release.get());
-    holder.wait();
-    EXPECT_EQ(SessionLines(ReadMarkerFile(L"shared.log")),
-              (Lines{"TRC host holder", "TRC host holder again"}));
+TEST_F(TraceSession, LinesFollowTheHostsOwnChangesOfListAndLevel)
+{
+    // Each change comes after an answer for this program was kept for the state before it.
+    Debug::start(L"net", true, false);
+    KELVRA_TRC(L"empty list");
+    for (const wchar_t* name : {L"another", L"trace_tests"})
+    {
+        Debug::lock();
+        Debug::_modules->assign(1, name);
+        Debug::unlock();
+        KELVRA_TRC(L"named in place: %s", name);
+    }
+    Debug::_lvl = Debug::lvlInfo;
+    KELVRA_TRC(L"dropped by the level");
+    KELVRA_INF(L"at the level");
+    Debug::_lvl = Debug::lvlDebug;
+    EXPECT_EQ(Written(L"net.log"),
+              (Lines{"TRC empty list", "TRC named in place: trace_tests", "INF at the level"}));
+}
+
+TEST_F(TraceSession, ConfigurationReadAtTheFirstLineOfAProcessSessionFiltersBothModules)
+{
+    // Each run empties net.log; the first one starts without a configuration file.
+    const std::pair<Lines, Lines> cases[] = {
+        // Not read while no session is open; names that configure read before it start the list.
+        {{"trc:early", "config:Sample.Net", "configure", "start:net:0:0", "trc:dropped", "sample-trc:kept"},
+         {"TRC sample kept"}},
+        // The highest level wins (CR LF lines), and a list shuts the other module out.
+        {{"config:warn\r\ninfo\r\nTraceChild\r\n", "start:net:0:0", "inf:i", "err:e", "sample-err:e"},
+         {"ERR host e"}},
+        // The listed module alone; stop and a new start (a new, empty list, whatever the first one
+        // taught) let every module trace.
+        {{"config:Sample.Net\nSAMPLE.NET\ninfo\n", "start:net:0:0", "inf:before", "sample-inf:before",
+          "sample-trc:before", "stop", "start:net:1:0", "inf:after", "trc:after", "sample-inf:after"},
+         {"INF sample before", "INF host after", "INF sample after"}},
+        // Read after stop, names start no list.
+        {{"config:Sample.Net", "start:net:0:0", "stop", "trc:kept", "sample-trc:kept"},
+         {"TRC host kept", "TRC sample kept"}},
+    };
+    for (const auto& [steps, written] : cases)
+    {
+        RunChild(steps);
+        EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log"), "TraceChild"), written) << steps[0];
+    }
 }
 
 TEST_F(TraceSession, ProcessNameFailuresThrowAndCloseTheFileAtOnce)
 {
-    // Copies of TraceChild.exe, the log file name, and what Debug::start throws.
-    const std::tuple<std::wstring, std::string, std::string> cases[] = {
-        {L"TraceChildNoDot", "nodot", "start:Failed to find the dot extension in the process file name"},
-        {L".exe", "dotonly", "start:Failed to find the process name"},
-    };
-    for (const auto& [program, log, failure] : cases)
-    {
-        const std::filesystem::path copy = BesideTestProgram(program);
-        std::filesystem::copy_file(BesideTestProgram(L"TraceChild.exe"), copy,
-                                   std::filesystem::copy_options::overwrite_existing);
-        // The per-process name fails before anything is opened; the fixed name after its file was
-        // opened, which must be closed again at once.
-        const ChildResult run = RunChild(
-            {"start:net:1:1", "start:" + log + ":0:0", "session", "open:" + log + ".log"}, false, program);
-        std::filesystem::remove(copy);
-        EXPECT_EQ(run.output, (Lines{failure, failure, "session:closed", "open:ok"}));
-        EXPECT_EQ(ReadMarkerFile(std::wstring(log.begin(), log.end()) + L".log"), "");
-    }
-    EXPECT_EQ(MarkerFiles(), (std::vector<std::wstring>{L"dotonly.log", L"nodot.log"}));
-}
-
-TEST_F(TraceSession, LinesRacingTheStartAreWholeOrAbsent)
-{
-    const ChildResult run = RunChild({"race:net"});
-    ASSERT_EQ(run.output.size(), 2u);
-    const size_t emitted = std::stoul(run.output[1].substr(std::strlen("race:")));
-    // From some line on, every line whole and in order, up to the last one.
-    const Lines lines = SessionLines(ReadMarkerFile(L"net.log"));
-    ASSERT_GE(lines.size(), 100u);
-    for (size_t i = 0; i < lines.size(); ++i)
-        EXPECT_EQ(lines[i], "TRC host race " + std::to_string(emitted - lines.size() + i));
-}
-
-TEST_F(TraceSession, ExitNoticeOnceWhenTheHostNeverStopped)
-{
-    const Lines notices = RunChild({"start:net:1:0", "trc:some line"}, true).debugStrings;
-    EXPECT_EQ(std::count(notices.begin(), notices.end(), kExitNotice), 1);
-}
-
-TEST_F(TraceSession, NoExitNoticeAfterStopEvenWhenTheConfigurationNamesModules)
-{
-    // Read after stop, the name starts no new list: every module keeps tracing.
-    WriteMarkerFile(L"debug", "Sample.Net\n");
-    const ChildResult run =
-        RunChild({"start:net:1:0", "stop", "trc:after stop", "sample-trc:after stop"}, true);
-    EXPECT_EQ(std::count(run.debugStrings.begin(), run.debugStrings.end(), kExitNotice), 0);
-    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")),
-              (Lines{"TRC host after stop", "TRC sample after stop"}));
-}
-
-TEST_F(TraceConfigured, LevelsAndNamesFilterTheLinesOfBothModules)
-{
-    const std::pair<std::string, Lines> cases[] = {
-        // First, while no file exists yet: every line of every module.
-        {"", {"TRC host t", "INF host i", "ERR host e", "TRC sample t", "INF sample i", "ERR sample e"}},
-        {"warn\r\ninfo\r\n", {"ERR host e", "ERR sample e"}}, // the highest level wins; CR LF lines
-        {"inf", {"INF host i", "ERR host e", "INF sample i", "ERR sample e"}},
-        // A byte-order mark and a trailing blank make module names of level words: level 0 stays,
-        // and the list shuts Sample.Net out.
-        {"\xEF\xBB\xBFinfo\ninfo \nTraceChild\n", {"TRC host t", "INF host i", "ERR host e"}},
-        {"info\n\n", {}}, // an empty line is a name no module has
-    };
-    for (const auto& [file, written] : cases)
-    {
-        if (!file.empty())
-            WriteMarkerFile(L"debug", file);
-        RunChild(
-            {"start:net:0:0", "trc:t", "inf:i", "err:e", "sample-trc:t", "sample-inf:i", "sample-err:e"});
-        EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")), written) << "[" << file << "]";
-    }
-}
-
-TEST_F(TraceConfigured, NamedModuleAloneTracesUntilStop)
-{
-    WriteMarkerFile(L"debug", "Sample.Net\nSAMPLE.NET\ninfo\n");
-    RunChild({"start:net:1:0", "inf:before", "sample-inf:before", "sample-trc:before", "stop", "inf:after",
-              "trc:after", "sample-inf:after"});
-    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")),
-              (Lines{"INF sample before", "INF host after", "INF sample after"}));
-}
-
-TEST_F(TraceConfigured, SecondStartAfterStopLetsEveryModuleTrace)
-{
-    // What was known under the first list (this program's lines dropped) holds no more.
-    WriteMarkerFile(L"debug", "Sample.Net\n");
-    RunChild({"start:net:1:0", "trc:dropped", "stop", "start:net:1:0", "trc:after the second start"});
-    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")), Lines{"TRC host after the second start"});
-}
-
-TEST_F(TraceConfigured, ReadBeforeTheSessionStartsTheFilterStillHolds)
-{
-    WriteMarkerFile(L"debug", "Sample.Net\n");
-    RunChild({"configure", "start:net:1:0", "trc:dropped", "sample-trc:kept"});
-    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")), Lines{"TRC sample kept"});
-}
-
-TEST_F(TraceConfigured, NotReadWhileNoSessionIsOpen)
-{
-    // The early line finds no session; the file written after it is the one that counts.
-    RunChild({"trc:early", "config:error", "start:net:1:0", "trc:late", "err:late"});
-    EXPECT_EQ(SessionLines(ReadMarkerFile(L"net.log")), Lines{"ERR host late"});
+    const std::filesystem::path copy = BesideTestProgram(L"TraceChildNoDot");
+    std::filesystem::copy_file(BesideTestProgram(L"TraceChild.exe"), copy,
+                               std::filesystem::copy_options::overwrite_existing);
+    // The per-process name fails before anything is opened, the fixed one after its file was
+    // opened: closed at once, it opens again (it would deny the second writer).
+    RunChild({"start:net:1:1", "start:net:0:0", "start:net:0:0", "trc:lost"}, L"TraceChildNoDot");
+    std::filesystem::remove(copy);
+    const std::string failure = "Failed to find the dot extension in the process file name\r\n";
+    EXPECT_EQ(ReadMarkerFile(L"failures"), failure + failure + failure);
+    EXPECT_EQ(ReadMarkerFile(L"net.log"), "");
 }
