@@ -12,7 +12,9 @@
 #include <windows.h>
 
 #include <cstdio>
+#include <thread>
 #include <utility>
+#include <vector>
 
 using namespace KelvraTraceTest;
 
@@ -111,6 +113,32 @@ TEST_F(TraceSession, LinesFollowTheHostsOwnChangesOfListAndLevel)
     Debug::_lvl = Debug::lvlDebug;
     EXPECT_EQ(Written(L"net.log"),
               (Lines{"TRC empty list", "TRC named in place: trace_tests", "INF at the level"}));
+}
+
+TEST_F(TraceSession, ThreadsNeverInterleaveNorLoseLines)
+{
+    const int threads = 4, linesEach = 2000;
+    Debug::start(L"threads", false, false);
+    std::vector<std::thread> writers;
+    for (int t = 0; t < threads; ++t)
+        writers.emplace_back(
+            [t]
+            {
+                for (int n = 0; n < linesEach; ++n)
+                    KELVRA_TRC(L"thread %d line %d of a line long enough to be written in several pieces", t,
+                               n);
+            });
+    for (std::thread& writer : writers)
+        writer.join();
+    const Lines lines = Written(L"threads.log");
+    ASSERT_EQ(lines.size(), static_cast<size_t>(threads * linesEach));
+    std::vector<int> next(threads, 0);
+    for (const std::string& line : lines)
+    {
+        int t = -1, n = -1;
+        ASSERT_EQ(std::sscanf(line.c_str(), "TRC thread %d line %d", &t, &n), 2) << line;
+        ASSERT_TRUE(t >= 0 && t < threads && n == next[t]++) << "lost or reordered: " << line;
+    }
 }
 
 TEST_F(TraceSession, ConfigurationReadAtTheFirstLineOfAProcessSessionFiltersBothModules)
