@@ -11,6 +11,7 @@
 #include <share.h>
 #include <windows.h>
 
+#include <atomic>
 #include <cstdio>
 #include <thread>
 #include <utility>
@@ -139,6 +140,28 @@ TEST_F(TraceSession, ThreadsNeverInterleaveNorLoseLines)
         ASSERT_EQ(std::sscanf(line.c_str(), "TRC thread %d line %d", &t, &n), 2) << line;
         ASSERT_TRUE(t >= 0 && t < threads && n == next[t]++) << "lost or reordered: " << line;
     }
+}
+
+TEST_F(TraceSession, LinesRacingTheStartAreWholeOrAbsent)
+{
+    std::atomic<bool> started(false);
+    int emitted = 0;
+    std::thread writer(
+        [&]
+        {
+            // Until 200 lines after the start was seen: the first ones find no session.
+            for (int after = 0; after < 200; after += started)
+                KELVRA_TRC(L"race %d", emitted++);
+        });
+    ::Sleep(20);
+    Debug::start(L"race", true, false);
+    started = true;
+    writer.join();
+    // From some line on, every line whole and in order, up to the last one.
+    const Lines lines = Written(L"race.log");
+    ASSERT_GE(lines.size(), 200u);
+    for (size_t i = 0; i < lines.size(); ++i)
+        EXPECT_EQ(lines[i], "TRC race " + std::to_string(emitted - lines.size() + i));
 }
 
 TEST_F(TraceSession, ConfigurationReadAtTheFirstLineOfAProcessSessionFiltersBothModules)
