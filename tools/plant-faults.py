@@ -261,7 +261,7 @@ FAULTS = [
     Fault("http.cut-off-html-post-too", "http", "A POST with a cut-off HTML body is sent again too",
           "src/http/RequestPipeline.cpp",
           "if (isGet && !disableAutoRedirect && KelvraHttp::IsCutOffHtml(responseContent))",
-          "if (!disableAutoRedirect && KelvraHttp::IsCutOffHtml(responseContent))"),
+          "if ((isGet || !isGet) && !disableAutoRedirect && KelvraHttp::IsCutOffHtml(responseContent))"),
     Fault("http.end-tag-at-body-end-missed", "http", "The HTML tag scan misses a tag at the very end",
           "src/http/ResponseText.cpp",
           "static_cast<size_t>(end - at) >= tag.size(); ++at)",
