@@ -104,12 +104,13 @@ bench)
     ;;
 soak)
     install_missing
-    build --target http_soak_tests
+    build --target http_soak
     # The servers write their ports where the test programs look for them.
     state=build/mingw/tests/data
     python3 tests/support/http_server.py start "$state"
     trap 'python3 tests/support/http_server.py stop "$state"' EXIT
-    KELVRA_SOAK_REQUESTS=${2:-10000} "$wine_run" build/mingw/bin/http_soak_tests.exe
+    "$wine_run" build/mingw/bin/http_soak.exe "http://127.0.0.1:$(cat "$state/http_server.port")" \
+        "https://127.0.0.1:$(cat "$state/https_server.port")" "${2:-10000}"
     ;;
 *)
     sed -n '2,10p' "$0" | sed 's/^# \{0,1\}//'

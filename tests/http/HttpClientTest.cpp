@@ -12,15 +12,18 @@
 #include <algorithm>
 #include <cstring>
 #include <filesystem>
+#include <set>
 
 using KelvraHttpTest::NewTraceLines;
 using KelvraHttpTest::ServerUrl;
+using KelvraStrings::Strings;
+using KelvraTest::RecordingWinHttp;
 
 namespace
 {
 
 testing::Environment* const traceSession =
-    testing::AddGlobalTestEnvironment(new KelvraHttpTest::TraceSession(L"http_tests"));
+    testing::AddGlobalTestEnvironment(new KelvraHttpTest::TraceSession);
 
 std::vector<double> progressReports;
 
@@ -28,6 +31,24 @@ bool RecordProgress(double percent)
 {
     progressReports.push_back(percent);
     return false;
+}
+
+size_t CountCalls(const std::vector<std::wstring>& calls, const std::wstring& prefix, size_t from = 0,
+                  size_t to = SIZE_MAX)
+{
+    size_t count = 0;
+    for (size_t i = from; i < std::min(to, calls.size()); ++i)
+        count += calls[i].rfind(prefix, 0) == 0 ? 1 : 0;
+    return count;
+}
+
+// An extra header, a cookie, the body "k=v" (for a POST) and, with a proxy, its user name and password.
+void Prepare(CWinHttpClient& client, const std::wstring& proxy = L"")
+{
+    client.SetAdditionalRequestHeaders(L"X-A: 1");
+    client.SetAdditionalRequestCookies(L"c=1");
+    client.SetAdditionalDataToSend(reinterpret_cast<const unsigned char*>("k=v"), 3);
+    client.SetProxy(proxy), client.SetProxyUsername(L"u"), client.SetProxyPassword(L"p");
 }
 
 } // namespace
@@ -51,13 +72,13 @@ TEST(HttpExchanges, ResultsAsTheClientShowsThem)
     const std::wstring echoed = L"X-One: 1\nCookie: a=1; b=2\nUser-Agent: WinHttpClient\n";
     const std::wstring type = L"/respond?header=Content-Type:%20text/plain;%20charset=";
     const std::wstring moved = L"/respond?status=302&header=Location:%20/respond%3Fbody%3Dmoved";
+    const auto fail = [](const wchar_t* error)
+    { return std::wstring(L"false ") + error + L"  [] 0/0 <> {} "; };
     const Row rows[] = {
-        {"GetEcho", nullptr, L"", L"/echo", L"GET", false,
+        {"MixedCaseGet", nullptr, L"", L"/echo", L"Get", false,
          L"true 0 () 200 [] 57/57 <> {} GET\n" + echoed + L"\n"},
         {"PostEcho", nullptr, L"", L"/echo", L"POST", false,
          L"true 0 () 200 [] 79/79 <> {} POST\n" + echoed + L"Content-Length: 3\n\nk=v"},
-        {"MixedCaseGet", nullptr, L"", L"/echo", L"Get", false,
-         L"true 0 () 200 [] 57/57 <> {} GET\n" + echoed + L"\n"},
         {"NotFoundIsAResponse", nullptr, L"", L"/respond?status=404&body=missing", L"GET", false,
          L"true 0 () 404 [] 7/7 <> {} missing"},
         {"ChunkedKeepsEarlierLength", nullptr, L"/respond?body=12345", L"/respond?chunked=1&body=abcdefg",
@@ -81,7 +102,8 @@ TEST(HttpExchanges, ResultsAsTheClientShowsThem)
          L"true 0 () 200 [] 0/0 <> {a=1; Path=/; b=2;c=3;} "},
         {"CutHtmlGetSentFiveTimes", nullptr, L"/respond?key=get&body=%3CHTML%3Ecut", L"/count?key=get",
          L"GET", false, L"true 0 () 200 [] 1/1 <> {} 5"},
-        {"WholeHtmlGetSentOnce", nullptr, L"/respond?key=whole&body=%3Chtml%3Eok%3C/HTML%3E",
+        // The end tag last, right after a '<' the scan has just passed.
+        {"WholeHtmlGetSentOnce", nullptr, L"/respond?key=whole&body=%3Chtml%3E%3C%3C/HTML%3E",
          L"/count?key=whole", L"GET", false, L"true 0 () 200 [] 1/1 <> {} 1"},
         {"CutHtmlPostSentOnce", nullptr, L"/respond?key=post&body=%3Chtml%3Ecut", L"/count?key=post", L"POST",
          false, L"true 0 () 200 [] 1/1 <> {} 1"},
@@ -93,15 +115,16 @@ TEST(HttpExchanges, ResultsAsTheClientShowsThem)
         {"ContentLocationIsNoLocation", nullptr, L"",
          L"/respond?status=201&header=Content-Location:%20/other&header=Location:%20/made", L"GET", true,
          L"true 0 () 201 [] 0/0 </made> {} "},
-        {"RefusedPort", nullptr, L"", L"http://127.0.0.1:1/", L"GET", false,
-         L"false 0 (12029)  [] 0/0 <> {} "},
+        {"RefusedPort", nullptr, L"", L"http://127.0.0.1:1/", L"GET", false, fail(L"0 (12029)")},
         {"PathTooLongForItsBuffer", nullptr, L"", L"/" + std::wstring(1500, L'p'), L"GET", false,
-         L"false 122 ()  [] 0/0 <> {} "},
+         fail(L"122 ()")},
+        {"OtherMethodRefused", nullptr, L"", L"/respond", L"PUT", false, fail(L"87 ()")},
+        {"EmptyUrl", nullptr, L"", L"", L"GET", false, fail(L"3 ()")},
         {"SelfSignedAccepted", nullptr, L"", L"https:/respond?body=secure", L"GET", false,
          L"true 0 () 200 [] 6/6 <> {} secure"},
         {"SelfSignedRefusedWhenRequired",
          [](CWinHttpClient& client) { client.SetRequireValidSslCertificates(true); }, L"",
-         L"https:/respond?body=secure", L"GET", false, L"false 0 (12157)  [] 0/0 <> {} "},
+         L"https:/respond?body=secure", L"GET", false, fail(L"0 (12157)")},
     };
     for (const Row& row : rows)
     {
@@ -114,11 +137,12 @@ TEST(HttpExchanges, ResultsAsTheClientShowsThem)
         bool result = false;
         for (const std::wstring* path : {&row.before, &row.path})
         {
-            if (path->empty())
+            if (path->empty() && path == &row.before)
                 continue;
             const bool secure = path->rfind(L"https:", 0) == 0;
-            client.UpdateUrl((*path)[0] == L'/' || secure ? ServerUrl(path->substr(secure ? 6 : 0), secure)
-                                                          : *path);
+            client.UpdateUrl(secure || path->rfind(L"/", 0) == 0
+                                 ? ServerUrl(path->substr(secure ? 6 : 0), secure ? L"https" : L"http")
+                                 : *path);
             if (std::wstring(row.method) == L"POST")
                 client.SetAdditionalDataToSend(reinterpret_cast<const unsigned char*>("k=v"), 3);
             NewTraceLines();
@@ -128,21 +152,21 @@ TEST(HttpExchanges, ResultsAsTheClientShowsThem)
         for (const std::wstring& line : NewTraceLines())
             if (line.rfind(L"TRC Send failed with error [", 0) == 0)
                 failedSend = line.substr(28, line.size() - 29);
-        EXPECT_EQ(KelvraStrings::Strings::Format(
-                      L"%s %u (%s) %s [%s] %u/%u <%s> {%s} %s", result ? L"true" : L"false",
-                      client.GetLastError(), failedSend.c_str(), client.GetResponseStatusCode().c_str(),
-                      client.GetResponseCharset().c_str(), client.GetRawResponseReceivedContentLength(),
-                      client.GetRawResponseContentLength(), client.GetResponseLocation().c_str(),
-                      client.GetResponseCookies().c_str(), client.GetResponseContent().c_str()),
+        EXPECT_EQ(Strings::Format(L"%s %u (%s) %s [%s] %u/%u <%s> {%s} %s", result ? L"true" : L"false",
+                                  client.GetLastError(), failedSend.c_str(),
+                                  client.GetResponseStatusCode().c_str(), client.GetResponseCharset().c_str(),
+                                  client.GetRawResponseReceivedContentLength(),
+                                  client.GetRawResponseContentLength(), client.GetResponseLocation().c_str(),
+                                  client.GetResponseCookies().c_str(), client.GetResponseContent().c_str()),
                   row.expected);
         EXPECT_TRUE(!result ||
                     client.GetRawResponseContent()[client.GetRawResponseReceivedContentLength()] == 0);
     }
 }
 
-// 64 MiB arrive whole and are saved byte for byte; progress goes from 0 to 100 with a
-// Content-Length and is never reported without one. Nothing is saved without a body, and a write
-// that fails is no success.
+// 4 MiB of every byte value arrive whole and are saved byte for byte; progress goes from 0 to 100
+// with a Content-Length and is never reported without one. Nothing is saved without a body, and a
+// write that fails is no success.
 TEST(HttpExchanges, LargeBodySavedWithProgress)
 {
     const std::wstring file = KelvraTest::DataPath(L"large_body.bin");
@@ -152,13 +176,13 @@ TEST(HttpExchanges, LargeBodySavedWithProgress)
     EXPECT_FALSE(client.SaveResponseToFile(file));
     EXPECT_FALSE(std::filesystem::exists(file));
 
-    client.UpdateUrl(ServerUrl(L"/big?size=67108864"));
+    client.UpdateUrl(ServerUrl(L"/big?size=4194304"));
     ASSERT_TRUE(client.SendHttpRequest(L"GET", false));
     EXPECT_FALSE(client.SaveResponseToFile(L"Z:\\dev\\full"));
     ASSERT_TRUE(client.SaveResponseToFile(file));
-    std::string expected(64u << 20, '\0');
+    std::string expected(4u << 20, '\0');
     for (size_t i = 0; i < expected.size(); ++i)
-        expected[i] = static_cast<char>(33 + (i % 65521) * 7919 % 94); // BLOCK in http_server.py
+        expected[i] = static_cast<char>(i % 65521 * 7919 % 251); // BLOCK in http_server.py
     EXPECT_TRUE(KelvraTest::ReadBinaryFile(file) == expected) << "the saved body differs";
     EXPECT_TRUE(std::filesystem::remove(file));
     ASSERT_GE(progressReports.size(), 2u);
@@ -166,10 +190,10 @@ TEST(HttpExchanges, LargeBodySavedWithProgress)
     EXPECT_EQ(progressReports.back(), 100.0);
     EXPECT_TRUE(std::is_sorted(progressReports.begin(), progressReports.end()));
 
-    CWinHttpClient chunked(ServerUrl(L"/big?chunked=1&size=100000"), &RecordProgress);
+    CWinHttpClient chunked(ServerUrl(L"/respond?chunked=1&body=abcdefg"), &RecordProgress);
     progressReports.clear();
     ASSERT_TRUE(chunked.SendHttpRequest(L"GET", false));
-    EXPECT_EQ(chunked.GetResponseContent().size(), 100000u);
+    EXPECT_EQ(chunked.GetResponseContent(), L"abcdefg");
     EXPECT_TRUE(progressReports.empty());
 
     // A callback that throws, against its contract, fails the request; nothing leaves it.
@@ -183,7 +207,6 @@ TEST(HttpExchanges, LargeBodySavedWithProgress)
 // binding (error 2, the look-up Wine refuses) answer.
 TEST(HttpTrace, SequencesOfAClientsLife)
 {
-    using KelvraStrings::Strings;
     KelvraHttpTest::UserProxySettings settings;
     KelvraTest::RecordingWinHttp platform;
     int headerSize = 0;
@@ -211,8 +234,8 @@ TRC Connecting to server with host [127.0.0.1], port [%s]
 TRC Creating the request to [%s]
 TRC Request was created
 TRC Cracking proxy configuration
+TRC Setting auto proxy settings
 )";
-    const std::wstring user = L"TRC Setting auto proxy settings\n";
     const wchar_t* answered = LR"(TRC [1] try
 TRC Sending the Http request, total data to send [%d]
 TRC Send succeeded
@@ -236,17 +259,21 @@ TRC Finished reading response available data
         L"TRC Closing request\nTRC Closing connection\nINF Destructing the Http client\n";
     const std::wstring url = ServerUrl(L"/respond?body=hello");
     const std::wstring port = url.substr(17, url.find(L'/', 17) - 17);
-    const std::wstring get = life(url, L"GET", "");
     const std::wstring getOpening =
         Strings::Format(opening, url.c_str(), L"GET", port.c_str(), L"/respond?body=hello");
+    // Each life runs before its expected text, which takes the header size it measured.
+    const std::wstring get = life(url, L"GET", "");
     const std::wstring getAnswered = Strings::Format(answered, 0, L"", headerSize) + closing;
-    EXPECT_EQ(get, getOpening + user + getAnswered);
+    EXPECT_EQ(get, getOpening + getAnswered);
     const std::wstring post = life(url, L"post", "name=value");
-    const wchar_t* writing =
-        L"TRC Writing data to the request, total data to send [10]\nTRC Total data sent [10]\n";
-    EXPECT_EQ(post, Strings::Format(opening, url.c_str(), L"post", port.c_str(), L"/respond?body=hello") +
-                        user + Strings::Format(answered, 10, writing, headerSize) + closing);
-    std::wstring refused = Strings::Format(opening, L"http://127.0.0.1:1/", L"GET", L"1", L"/") + user;
+    EXPECT_EQ(post,
+              Strings::Format(opening, url.c_str(), L"post", port.c_str(), L"/respond?body=hello") +
+                  Strings::Format(
+                      answered, 10,
+                      L"TRC Writing data to the request, total data to send [10]\nTRC Total data sent [10]\n",
+                      headerSize) +
+                  closing);
+    std::wstring refused = Strings::Format(opening, L"http://127.0.0.1:1/", L"GET", L"1", L"/");
     for (int attempt = 1; attempt <= 5; ++attempt)
         refused += Strings::Format(L"TRC [%d] try\nTRC Sending the Http request, total data to send [0]\n"
                                    L"TRC Send failed with error [12029]\n",
@@ -255,14 +282,14 @@ TRC Finished reading response available data
 
     // Through each kind of user's settings. Wine refuses the script's look-up (87); the binding
     // answers it once, with lists of its own.
-    platform.Add({L"GetIEProxyConfigForCurrentUser", ERROR_FILE_NOT_FOUND});
+    platform.Fail(L"GetIEProxyConfigForCurrentUser", ERROR_FILE_NOT_FOUND);
     EXPECT_EQ(life(url, L"GET", ""),
-              getOpening + user + L"TRC No Internet Explorer proxy settings can be found\n" + getAnswered);
+              getOpening + L"TRC No Internet Explorer proxy settings can be found\n" + getAnswered);
     const std::wstring bypass = L"<local>;" + std::wstring(300, L'b') + L".example";
     settings.Set(L"127.0.0.1:8888", bypass, L"");
     const std::wstring released = L"TRC Releasing lpszProxy\nTRC Releasing lpszProxyBypass\n";
     EXPECT_EQ(life(url, L"GET", ""),
-              getOpening + user +
+              getOpening +
                   L"TRC Could not find IE Auto Config Url but IE proxy url is set to [127.0.0.1:8888]\n"
                   L"TRC IE optional proxy by-pass server list is set to [" +
                   bypass +
@@ -272,14 +299,14 @@ TRC Finished reading response available data
     const std::wstring script =
         ServerUrl(L"/respond?body=function%20FindProxyForURL(u,h){return%22PROXY%20127.0.0.1:8888%22}");
     settings.Set(L"127.0.0.1:8888", L"<local>", script);
-    const std::wstring lookUp =
-        user + L"TRC IE Auto Config Url is set to [" + script + L"]\nTRC Retrieving user's proxy data\n";
+    const std::wstring lookUp = getOpening + L"TRC IE Auto Config Url is set to [" + script +
+                                L"]\nTRC Retrieving user's proxy data\n";
     const std::wstring userReleased = L"TRC Releasing lpszAutoConfigUrl\n" + released;
     platform.lookedUpProxy = {L"127.0.0.1:8889", L"*.local"};
-    EXPECT_EQ(life(url, L"GET", ""), getOpening + lookUp + L"TRC Setting user's proxy data\n" + released +
-                                         userReleased + getAnswered);
+    EXPECT_EQ(life(url, L"GET", ""),
+              lookUp + L"TRC Setting user's proxy data\n" + released + userReleased + getAnswered);
     platform.lookedUpProxy.clear();
-    EXPECT_EQ(life(url, L"GET", ""), getOpening + lookUp +
+    EXPECT_EQ(life(url, L"GET", ""), lookUp +
                                          L"ERR Failed to retrieve user's proxy data\n"
                                          L"ERR Last documented error [87]\n" +
                                          userReleased + closing);
@@ -287,6 +314,190 @@ TRC Finished reading response available data
          {L"SetOption 38 3 127.0.0.1:8888 " + bypass, L"GetProxyForUrl " + url + L" 3 1 " + script + L" 1",
           std::wstring(L"SetOption 38 3 127.0.0.1:8889 *.local")})
         EXPECT_GE(std::count(platform.calls.begin(), platform.calls.end(), call), 1) << call;
-    EXPECT_TRUE(platform.handedOut.empty());
-    EXPECT_EQ(platform.strayFrees, 0);
+    EXPECT_EQ(platform.Imbalance(), std::vector<size_t>(4, 0));
+}
+
+// Replies no well-behaved server sends, from the hostile listener: a fresh client with a receive
+// time-out of 1 s GETs each in bounded time, with the result the client documents or the one
+// WinHTTP gives, leaves no handle open, and then GETs a plain answer. The summary: "<result> <last
+// error> <status> <received>/<announced> h<header characters> c<cookie characters> <content>".
+TEST(HttpHostileServers, EveryReplyEndsInTimeWithNothingOpen)
+{
+    const std::pair<const wchar_t*, std::wstring> rows[] = {
+        // 2,048 lines of 512 bytes. (Wine stores header lines in time of the square of their
+        // count: 16,384 lines of 64 bytes took it 30 s.)
+        {L"many-lines", L"true 0 200 2/2 h1048614 c0 ok"},
+        // Wine keeps the first 1,460 bytes or so of a header line and drops the rest of it.
+        {L"long-line", L"true 0 200 2/2 h1499 c0 ok"},
+        // 20,000 Set-Cookie lines: every value is kept ("c00000=0; ...; c19999=19999;").
+        {L"cookies", L"true 0 200 2/2 h508928 c268889 ok"},
+        // A length beyond 32 bits counts as the largest one; the body ends at the close.
+        {L"huge-length", L"true 0 200 5/4294967295 h57 c0 short"},
+        {L"five-gib", L"true 0 200 5/4294967295 h47 c0 short"},
+        // Wine takes a reply cut in its headers for one without a body.
+        {L"cut-headers", L"true 0 200 0/0 h17 c0 "},
+        {L"cut-body", L"true 0 200 7/1000 h41 c0 partial"},
+        {L"garbage-status", L"false 12152  0/0 h0 c0 "},
+        {L"empty", L"false 12152  0/0 h0 c0 "},
+        // The headers, then 4 s of silence: the receive time-out ends the body's wait, Wine
+        // answering 10060 (WSAETIMEDOUT) where Windows answers 12002.
+        {L"stall", L"false 10060 200 0/100 h40 c0 "},
+    };
+    for (const auto& [reply, expected] : rows)
+    {
+        SCOPED_TRACE(testing::Message() << reply);
+        KelvraTest::RecordingWinHttp platform;
+        {
+            CWinHttpClient client(ServerUrl(L"/" + std::wstring(reply), L"hostile"));
+            client.SetTimeouts(0, 5000, 5000, 1000);
+            const ULONGLONG start = ::GetTickCount64();
+            const bool result = client.SendHttpRequest(L"GET", false);
+            const ULONGLONG took = ::GetTickCount64() - start;
+            EXPECT_LT(took, reply == std::wstring(L"cookies") ? 20000u : 3000u);
+            EXPECT_EQ(Strings::Format(L"%s %u %s %u/%u h%u c%u %s", result ? L"true" : L"false",
+                                      client.GetLastError(), client.GetResponseStatusCode().c_str(),
+                                      client.GetRawResponseReceivedContentLength(),
+                                      client.GetRawResponseContentLength(),
+                                      unsigned(client.GetResponseHeader().size()),
+                                      unsigned(client.GetResponseCookies().size()),
+                                      client.GetResponseContent().substr(0, 16).c_str()),
+                      expected)
+                << took << " ms";
+            client.UpdateUrl(ServerUrl(L"/respond?body=fine"));
+            EXPECT_TRUE(client.SendHttpRequest(L"GET", false));
+            EXPECT_EQ(client.GetResponseContent(), L"fine");
+        }
+        EXPECT_EQ(platform.Imbalance(), std::vector<size_t>(4, 0));
+    }
+}
+
+// User agent, time-outs, flags, headers, manual proxy (whole, however long) with its credentials
+// (their bytes, no terminator) and body reach WinHTTP in this order; a second request reuses the
+// session, sends no body after a new URL and, with certificates required, sets no security flags;
+// a password without a user name is never sent.
+TEST(HttpPlatformCalls, SettingsReachThePlatformInOrder)
+{
+    RecordingWinHttp platform;
+    const std::wstring proxy = std::wstring(300, L'p') + L".example:8080";
+    {
+        CWinHttpClient client(ServerUrl(L"/respond?body=secure", L"https"));
+        Prepare(client, proxy);
+        client.SetProxyUsername(L"user");
+        client.SetUserAgent(L"Agent/1");
+        client.SetTimeouts(1000, 2000, 3000, 4000);
+        ASSERT_TRUE(client.SendHttpRequest(L"get", true));
+        client.SetUserAgent(L"Agent/2");
+        client.SetRequireValidSslCertificates(true);
+        client.SetProxyUsername(L"");
+        client.UpdateUrl(ServerUrl(L"/respond?body=secure", L"https"));
+        client.SendHttpRequest(L"GET", false);
+    }
+    std::wstring calls;
+    for (const std::wstring& call : platform.calls)
+        calls += call + L"\n";
+    EXPECT_EQ(calls.find(L"Open Agent/1 0 null null 0\nSetTimeouts 1000 2000 3000 4000\n"), 0u) << calls;
+    EXPECT_NE(
+        calls.find(L"OpenRequest GET /respond?body=secure null null 8388608\nSetOption 31 12544\n"
+                   L"AddRequestHeaders X-A: 1 6 16777216\nAddRequestHeaders Cookie: c=1 11 16777216\n"
+                   L"SetOption 63 2\nSetOption 38 3 " +
+                   proxy +
+                   L" null\nSetOption 4098 user\nSetOption 4099 p\nSendRequest null 0 0 3 0\nWriteData 3\n"),
+        std::wstring::npos);
+    for (const auto& [call, count] : {std::pair{L"Open ", 1u},
+                                      {L"SetTimeouts 1000 2000 3000 4000", 2u},
+                                      {L"SetOption 31", 1u},
+                                      {L"SetOption 4099", 1u},
+                                      {L"SendRequest null 0 0 0 0", 5u}})
+        EXPECT_EQ(CountCalls(platform.calls, call), count) << call;
+    EXPECT_EQ(CountCalls(platform.calls, L"SetOption 38 3 " + proxy), 2u);
+}
+
+// A GET through the user's auto-config script (the binding answers the look-up), a POST through
+// a manual proxy with credentials and a POST through the user's fixed proxy with its bypass list,
+// each once for every platform call its clean run makes, with that call alone failing (12345; a
+// receive asks for a resend, 12032, on all five tries). A call whose failure fails its stage ends
+// the request through the failure path: the stage's error line, the error, and only what the
+// request opened closed; each proxy text is freed once, and the session serves the next request.
+TEST(HttpFaults, AnyPlatformCallFailing)
+{
+    // The operations whose failure fails the request; a failure of any other is retried or skipped.
+    const std::wstring failsTheRequest = L" Open CrackUrl Connect OpenRequest AddRequestHeaders SetOption "
+                                         L"GetIEProxyConfigForCurrentUser GetProxyForUrl WriteData "
+                                         L"ReceiveResponse QueryDataAvailable ";
+    const std::wstring script = L"http://127.0.0.1:1/p.pac";
+    std::set<std::wstring> messages; // "<operation>: <error line>"
+    for (const auto& [method, proxy] :
+         {std::pair{L"GET", script}, std::pair{L"POST", std::wstring(L"manual")},
+          std::pair{L"POST", std::wstring()}})
+    {
+        KelvraHttpTest::UserProxySettings settings;
+        settings.Set(L"127.0.0.1:8888", L"<local>", proxy == script ? script : L"");
+        std::vector<std::wstring> cleanCalls;
+        for (size_t failing = 0; failing <= cleanCalls.size(); ++failing)
+        {
+            const std::wstring call = failing == 0 ? L"none" : cleanCalls[failing - 1];
+            const std::wstring op = call.substr(0, call.find(L' '));
+            const bool receive = op == L"ReceiveResponse";
+            const DWORD error = receive ? ERROR_WINHTTP_RESEND_REQUEST : 12345;
+            SCOPED_TRACE(testing::Message() << method << " " << proxy << ", failing: " << call);
+            RecordingWinHttp platform;
+            platform.lookedUpProxy = {L"127.0.0.1:8889", L"*.local"};
+            {
+                CWinHttpClient client(ServerUrl(L"/respond?body=abc"));
+                Prepare(client, proxy == L"manual" ? L"127.0.0.1:8888" : L"");
+                int occurrence = 0;
+                for (size_t i = 0; i < failing; ++i)
+                    occurrence += cleanCalls[i].substr(0, cleanCalls[i].find(L' ')) == op ? 1 : 0;
+                platform.Fail(op, error, occurrence, receive ? 5 : 1);
+                NewTraceLines();
+                const bool result = client.SendHttpRequest(method, std::wstring(method) == L"POST");
+                const std::vector<std::wstring> trace = NewTraceLines();
+                if (failing == 0)
+                    cleanCalls = platform.calls;
+                const bool fails = failsTheRequest.find(L' ' + op + L' ') != std::wstring::npos;
+                EXPECT_EQ(result, !fails);
+                EXPECT_EQ(client.GetLastError(), fails ? error : 0u);
+                // What was opened before the failing call, and only that, is closed.
+                const auto closed = [&](const wchar_t* line, const wchar_t* opening)
+                {
+                    return std::count(trace.begin(), trace.end(), line) ==
+                           (!fails || CountCalls(cleanCalls, opening, 0, failing - 1) > 0 ? 1 : 0);
+                };
+                EXPECT_TRUE(closed(L"TRC Closing request", L"OpenRequest "));
+                EXPECT_TRUE(closed(L"TRC Closing connection", L"Connect "));
+                const auto last = std::find(trace.begin(), trace.end(),
+                                            L"ERR Last documented error [" + std::to_wstring(error) + L"]");
+                EXPECT_EQ(last != trace.end(), fails);
+                if (last != trace.begin() && last != trace.end())
+                    messages.insert(op + L": " + last[-1]);
+                EXPECT_EQ(platform.open.size(), op == L"Open" ? 0u : 1u);
+                platform.ClearFaults();
+                EXPECT_TRUE(client.SendHttpRequest(L"GET", false));
+                EXPECT_EQ(CountCalls(platform.calls, L"Open "), op == L"Open" ? 2u : 1u);
+            }
+            EXPECT_EQ(platform.Imbalance(), std::vector<size_t>(4, 0));
+        }
+        EXPECT_GT(cleanCalls.size(), 20u);
+    }
+    std::wstring seen;
+    for (const std::wstring& message : messages)
+        seen += message + L"\n";
+    EXPECT_EQ(seen, LR"(AddRequestHeaders: ERR Adding request headers cookie failed
+AddRequestHeaders: ERR Adding request headers failed
+Connect: ERR Connecting failed
+CrackUrl: ERR Extracting url failed
+GetIEProxyConfigForCurrentUser: ERR Failed to auto detect proxy settings
+GetProxyForUrl: ERR Failed to retrieve user's proxy data
+Open: ERR Creating Http session failed
+OpenRequest: ERR Creating the request failed
+QueryDataAvailable: ERR Failed to get the amount of data, in bytes, available to be read
+ReceiveResponse: ERR Waiting for server's response failed [12032]
+SetOption: ERR Disabling auto redirect option failed
+SetOption: ERR Setting IE proxy data to the request failed
+SetOption: ERR Setting manual proxy password fialed
+SetOption: ERR Setting manual proxy settings failed
+SetOption: ERR Setting manual proxy username failed
+SetOption: ERR Setting user's proxy data failed
+WriteData: ERR Writing data to the request failed
+)");
 }

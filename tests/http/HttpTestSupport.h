@@ -1,6 +1,6 @@
 // What the HTTP client's tests share: the local servers (tests/support/http_server.py, started by
-// ctest) and the trace session, c:\keltrace\http_tests.log (HttpClientTest.cpp opens it), read with
-// the trace tests' helpers.
+// ctest), the trace session c:\keltrace\http_tests.log read back line by line, and the current
+// user's proxy settings.
 #pragma once
 
 #include "KelvraStrings.h"
@@ -15,34 +15,19 @@
 #include <cstdio>
 #include <filesystem>
 #include <string>
-#include <utility>
 #include <vector>
 
 namespace KelvraHttpTest
 {
 
-// "http://127.0.0.1:<port>" or "https://127.0.0.1:<port>" followed by path, for the listener whose
-// port stands in portFile.
-inline std::wstring LocalUrl(const wchar_t* portFile, const std::wstring& path, bool secure = false)
+// path on one of the local listeners: "http", "https" or "hostile" (scripted replies, named by path).
+inline std::wstring ServerUrl(const std::wstring& path, const std::wstring& listener = L"http")
 {
-    const std::string port = KelvraTest::ReadBinaryFile(KelvraTest::DataPath(portFile));
-    return (secure ? L"https://127.0.0.1:" : L"http://127.0.0.1:") + std::wstring(port.begin(), port.end()) +
-           path;
+    const std::string port = KelvraTest::ReadBinaryFile(KelvraTest::DataPath(listener + L"_server.port"));
+    return (listener == L"https" ? L"https" : L"http") +
+           (L"://127.0.0.1:" + std::wstring(port.begin(), port.end())) + path;
 }
 
-inline std::wstring ServerUrl(const std::wstring& path, bool secure = false)
-{
-    return LocalUrl(secure ? L"https_server.port" : L"http_server.port", path, secure);
-}
-
-// The hostile listener's scripted reply of that name.
-inline std::wstring HostileUrl(const std::wstring& reply)
-{
-    return LocalUrl(L"hostile_server.port", L"/" + reply);
-}
-
-// How much of this program's trace log the tests have seen: the session banner, then what
-// NewTraceLines returned.
 inline size_t traceLogSeen = 0;
 
 // The trace lines written since the previous call, each as "<tag> <message>" ("TRC [1] try").
@@ -57,19 +42,17 @@ inline std::vector<std::wstring> NewTraceLines()
     return lines;
 }
 
-// A trace session of the program in c:\keltrace\<name>.log while its tests run; the log is
-// removed at the end, and c:\keltrace left as it was found.
+// The program's trace session, c:\keltrace\http_tests.log, while its tests run; c:\keltrace is
+// left as it was found.
 class TraceSession : public testing::Environment
 {
 public:
-    explicit TraceSession(std::wstring name) : m_name(std::move(name)) {}
-
     void SetUp() override
     {
         m_created = std::filesystem::create_directory(KelvraTraceTest::kMarker);
-        Debug::start(m_name, false, false);
+        Debug::start(L"http_tests", false, false);
         ASSERT_NE(CLog::_log, nullptr) << "no trace session in c:\\keltrace";
-        traceLogSeen = KelvraTraceTest::ReadMarkerFile(m_name + L".log").size();
+        traceLogSeen = KelvraTraceTest::ReadMarkerFile(L"http_tests.log").size();
     }
     void TearDown() override
     {
@@ -78,19 +61,17 @@ public:
         std::fclose(CLog::_log);
         CLog::_log = nullptr;
         Debug::unlock();
-        std::filesystem::remove(KelvraTraceTest::kMarker / (m_name + L".log"));
+        std::filesystem::remove(KelvraTraceTest::kMarker / L"http_tests.log");
         if (m_created)
             std::filesystem::remove(KelvraTraceTest::kMarker);
     }
 
 private:
-    std::wstring m_name;
     bool m_created = false;
 };
 
 // The current user's proxy settings, in the registry value Wine's WinHTTP reads (README): none
-// while the object lives, unless set, then the value found is put back. Holders run under the
-// ctest lock hkcu_proxy.
+// while the object lives, unless set; then the value found is put back (ctest lock hkcu_proxy).
 class UserProxySettings
 {
 public:
@@ -128,7 +109,7 @@ private:
         L"Software\\Microsoft\\Windows\\CurrentVersion\\Internet Settings\\Connections";
     static constexpr const wchar_t* kValue = L"DefaultConnectionSettings";
     std::string m_saved;
-    LONG m_read; // restored if read, removed if absent
+    LONG m_read;
 };
 
 } // namespace KelvraHttpTest
