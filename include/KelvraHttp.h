@@ -75,6 +75,7 @@ public:
     const unsigned char* GetRawResponseContent() const;
     // The latest Content-Length announced (not the bytes received), 0 until one is seen.
     std::uint32_t GetRawResponseContentLength() const;
+    // The bytes GetRawResponseContent holds, also after a request that failed while reading.
     std::uint32_t GetRawResponseReceivedContentLength() const;
     // 0 after a request that succeeded or whose every send failed; see SendHttpRequest.
     std::uint32_t GetLastError() const;

@@ -12,9 +12,17 @@ const std::uint64_t kReserved = std::uint64_t{1} << 32;
 
 } // namespace
 
-unsigned char* ReserveBody()
+unsigned char* ReserveBody(std::uint64_t& committed)
 {
-    return static_cast<unsigned char*>(::VirtualAlloc(nullptr, kReserved, MEM_RESERVE, PAGE_NOACCESS));
+    committed = 0;
+    auto* const body =
+        static_cast<unsigned char*>(::VirtualAlloc(nullptr, kReserved, MEM_RESERVE, PAGE_NOACCESS));
+    if (body != nullptr && !CommitBody(body, committed, 1))
+    {
+        ReleaseBody(body);
+        return nullptr;
+    }
+    return body;
 }
 
 bool CommitBody(unsigned char* body, std::uint64_t& committed, std::uint64_t size)

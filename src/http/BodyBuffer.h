@@ -8,8 +8,9 @@
 namespace KelvraHttp
 {
 
-// A new block with nothing committed, or null when the address space cannot be had.
-unsigned char* ReserveBody();
+// A new block whose first byte is committed and reads as zero (committed is then 1), so that an
+// empty body is readable however the request ends; null when the memory cannot be had.
+unsigned char* ReserveBody(std::uint64_t& committed);
 // Commits the block's first size bytes (committed holds how many are): they read as zero until
 // written. False, with nothing changed, when size is beyond the block or memory cannot be had.
 bool CommitBody(unsigned char* body, std::uint64_t& committed, std::uint64_t size);

@@ -137,12 +137,12 @@ void CWinHttpClient::ReadStatusCode(void* request)
 
 void CWinHttpClient::ReadBody(void* connection, void* request, std::uint64_t announcedLength)
 {
-    // The received count describes the block at every moment: a request that fails while reading
-    // leaves the bytes read so far, never a count left from a longer body.
+    // The received count describes the block however reading ends: a request that fails while
+    // reading leaves the bytes read so far and their count, never a count left from a longer body.
     KelvraHttp::ReleaseBody(rawResponseContent);
-    rawResponseContent = KelvraHttp::ReserveBody();
+    std::uint64_t committed;
+    rawResponseContent = KelvraHttp::ReserveBody(committed);
     rawResponseReceivedContentLength = 0;
-    std::uint64_t committed = 0;
     std::uint32_t received = 0;
     DWORD available;
     do
@@ -152,6 +152,7 @@ void CWinHttpClient::ReadBody(void* connection, void* request, std::uint64_t ann
         {
             const DWORD error = Platform().GetLastError();
             KELVRA_ERR(L"Failed to get the amount of data, in bytes, available to be read");
+            rawResponseReceivedContentLength = received;
             throw WinHttpException{error, connection, request, nullptr};
         }
         KELVRA_TRC(L"[%d] amount of data available to be read", available);

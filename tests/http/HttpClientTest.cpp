@@ -363,6 +363,9 @@ TEST(HttpHostileServers, EveryReplyEndsInTimeWithNothingOpen)
                                       client.GetResponseContent().substr(0, 16).c_str()),
                       expected)
                 << took << " ms";
+            // The received bytes are followed by a zero byte however the request ended.
+            const unsigned char* const body = client.GetRawResponseContent();
+            EXPECT_TRUE(body == nullptr || body[client.GetRawResponseReceivedContentLength()] == 0);
             client.UpdateUrl(ServerUrl(L"/respond?body=fine"));
             EXPECT_TRUE(client.SendHttpRequest(L"GET", false));
             EXPECT_EQ(client.GetResponseContent(), L"fine");
@@ -452,6 +455,8 @@ TEST(HttpFaults, AnyPlatformCallFailing)
                 NewTraceLines();
                 const bool result = client.SendHttpRequest(method, std::wstring(method) == L"POST");
                 const std::vector<std::wstring> trace = NewTraceLines();
+                const unsigned char* const body = client.GetRawResponseContent();
+                EXPECT_TRUE(body == nullptr || body[client.GetRawResponseReceivedContentLength()] == 0);
                 if (failing == 0)
                     cleanCalls = platform.calls;
                 const bool fails = failsTheRequest.find(L' ' + op + L' ') != std::wstring::npos;
