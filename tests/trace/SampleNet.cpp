@@ -5,8 +5,6 @@ extern "C" __declspec(dllexport) void SampleTrace(char level, const wchar_t* tex
 {
     if (level == 't')
         KELVRA_TRC(L"sample %s", text);
-    else if (level == 'i')
-        KELVRA_INF(L"sample %s", text);
     else
-        KELVRA_ERR(L"sample %s", text);
+        KELVRA_INF(L"sample %s", text);
 }

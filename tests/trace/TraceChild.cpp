@@ -1,9 +1,8 @@
 // TraceChild.exe: a host program the trace tests start in a fresh process (the trace state is
 // process-wide), built with a host's default compiler settings. Each argument is one step:
-//   start:<name>:<append 0|1>:<perProcess 0|1>, stop, configure: Debug's (what start throws goes to
+//   start:<append 0|1>:<perProcess 0|1>:<name>, stop, configure: Debug's (what they throw goes to
 //     c:\keltrace\failures, a line each); config:<text> writes c:\keltrace\debug;
-//   trc|inf|err:<text>, sample-trc|sample-inf|sample-err:<text>: a line "host <text>" of this
-//     module or "sample <text>" of Sample.Net.dll.
+//   trc|inf|sample-trc|sample-inf:<text>: "host <text>" of this module, "sample <text>" of Sample.Net.
 #include <Kelvra.h>
 
 #include <fstream>
@@ -18,11 +17,10 @@ int main(int argc, char** argv)
         const std::string step = argv[i], verb = step.substr(0, step.find(':'));
         const std::string argument = verb.size() < step.size() ? step.substr(verb.size() + 1) : "";
         const std::wstring text(argument.begin(), argument.end());
-        const size_t end = text.find(L':');
         try
         {
             if (verb == "start")
-                Debug::start(text.substr(0, end), text[end + 1] == L'1', text[end + 3] == L'1');
+                Debug::start(text.substr(4), text[0] == L'1', text[2] == L'1');
             else if (verb == "stop")
                 Debug::stop();
             else if (verb == "configure")
@@ -31,8 +29,6 @@ int main(int argc, char** argv)
                 KELVRA_TRC(L"host %s", text.c_str());
             else if (verb == "inf")
                 KELVRA_INF(L"host %s", text.c_str());
-            else if (verb == "err")
-                KELVRA_ERR(L"host %s", text.c_str());
             else if (verb.rfind("sample-", 0) == 0)
                 SampleTrace(verb[7], text.c_str());
             else if (verb != "config" ||

@@ -7,11 +7,8 @@
 #include "http/pattern/RegexException.h"
 
 #include <gmock/gmock.h>
-#include <gtest/gtest.h>
 
-#include <string>
 #include <utility>
-#include <vector>
 
 using namespace KelvraHeaderPatterns;
 using namespace KelvraTest;
@@ -34,6 +31,9 @@ TEST(ExtractPatternGroups, RefusesBadInputAndThrowsForAPatternWithoutGroup)
 
 TEST(ExtractPatternGroups, CollectsGroupZeroOfEveryMatchOnce)
 {
+    const std::wstring block = L"HTTP/1.1 302 Found\r\nContent-Type: text/html; Charset=iso-8859-1\r\n"
+                               L"content-length: 0\r\nLocation: 42abc\r\nSet-Cookie: sid=1; Path=/\r\n"
+                               L"SET-COOKIE: SID=1; PATH=/\r\nSet-Cookie:\t theme=dark\r\n\r\n";
     ExpectExtractions({
         {L"{[0-9]+}", L"a1b22c1d333", {L"1", L"22", L"333"}},
         {L"{a}{b}", L"abab", {L"a"}},
@@ -46,15 +46,6 @@ TEST(ExtractPatternGroups, CollectsGroupZeroOfEveryMatchOnce)
         // An empty match moves the search one character on: "!a" matches nothing at 1 and at 2.
         {L"{a*}", L"bab", {L"", L"a"}},
         {L"{!a}", L"abb", {L""}},
-    });
-}
-
-TEST(ExtractPatternGroups, ClientPatternsOnHeaderBlocks)
-{
-    const std::wstring block = L"HTTP/1.1 302 Found\r\nContent-Type: text/html; Charset=iso-8859-1\r\n"
-                               L"content-length: 0\r\nLocation: 42abc\r\nSet-Cookie: sid=1; Path=/\r\n"
-                               L"SET-COOKIE: SID=1; PATH=/\r\nSet-Cookie:\t theme=dark\r\n\r\n";
-    ExpectExtractions({
         {kCharset, block, {L"iso-8859-1"}},
         {kContentLength, block, {L"0"}},
         {kLocationValue, block, {L"42abc"}},
@@ -65,23 +56,17 @@ TEST(ExtractPatternGroups, ClientPatternsOnHeaderBlocks)
         {kLocationValue, L"\r\nContent-Location: /other\r\n", {}},
         // A cookie line ends at its first CR; a last line without line end gives nothing.
         {kCookies, L"Set-Cookie: x=1\r\r\nSet-Cookie: last=1", {L"x=1"}},
+        // The text ends at its first NUL.
+        {kCookies, std::wstring(L"Set-Cookie: a=1\r\n\0Set-Cookie: b=2\r\n", 35), {L"a=1"}},
     });
 }
 
-TEST(TrimChars, StripsTheSetFromBothEnds)
+TEST(CookieText, ValuesTrimmedJoinedWithABlankAndClosedWithASemicolon)
 {
     EXPECT_EQ(TrimChars(L" \t a;\t ", L" \t"), L"a;");
-    EXPECT_EQ(TrimChars(L"a ", L" "), L"a");
-    EXPECT_EQ(TrimChars(L"abc", L""), L"abc");
     EXPECT_EQ(TrimChars(L"    ", L" "), L"");
-    EXPECT_EQ(TrimChars(L"", L" "), L"");
-}
-
-TEST(AppendCookies, JoinsValuesWithABlankAndClosesWithASemicolon)
-{
     std::wstring cookies;
     KelvraHttp::AppendCookies(cookies, {L" a=1; Path=/", L"b=2"});
-    EXPECT_EQ(cookies, L"a=1; Path=/; b=2;");
     KelvraHttp::AppendCookies(cookies, {L"c=3;"});
     EXPECT_EQ(cookies, L"a=1; Path=/; b=2;c=3;");
 }

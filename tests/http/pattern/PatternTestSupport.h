@@ -1,6 +1,6 @@
 // The row checks of the matcher's tables. Each match runs on a worker thread within a time limit
 // and with a bounded stack, so that a match that never ends or runs away fails its row instead of
-// stalling the program or taking all memory.
+// stalling the program or taking all memory; the worker shares what it uses, as it may outlive the row.
 #pragma once
 
 #include "http/pattern/PatternExtraction.h"
@@ -11,8 +11,6 @@
 #include <algorithm>
 #include <array>
 #include <chrono>
-#include <cstdint>
-#include <cwchar>
 #include <future>
 #include <memory>
 #include <string>
@@ -35,7 +33,6 @@ inline void ExpectMatches(const std::vector<MatchRow>& rows)
     for (const auto& [pattern, text, expected] : rows)
     {
         SCOPED_TRACE("pattern " + testing::PrintToString(pattern) + " text " + testing::PrintToString(text));
-        // The worker shares these: a match that never ends outlives the row that gave up on it.
         const auto compiled = std::make_shared<CRegexPattern>();
         const auto context = std::make_shared<CRegexMatchContext>(256, kStackLimit);
         const auto end = std::make_shared<const wchar_t*>(nullptr);
@@ -44,16 +41,16 @@ inline void ExpectMatches(const std::vector<MatchRow>& rows)
                                         { return compiled->Match(text, *context, end.get()); });
         std::future<bool> matched = task.get_future();
         std::thread worker(std::move(task));
-        // Generous: on a loaded machine a new thread can wait seconds for its first turn.
+        // Generous: on a loaded machine a new thread can wait seconds for its first turn. Joined
+        // otherwise, so that no thread of a finished row is still ending when the program exits.
         if (matched.wait_for(std::chrono::seconds(30)) != std::future_status::ready)
         {
             worker.detach();
             FAIL() << "the match does not end";
         }
-        // Joined, so that no thread of a finished row is still ending when the program exits.
         worker.join();
         EXPECT_LT(context->StackSize(), kStackLimit) << "the match ran away";
-        const wchar_t* const textEnd = text + std::wcslen(text);
+        const wchar_t* const textEnd = text + std::char_traits<wchar_t>::length(text);
         std::wstring found = L"none";
         if (matched.get())
         {
@@ -63,8 +60,7 @@ inline void ExpectMatches(const std::vector<MatchRow>& rows)
             for (std::uint32_t group = 0; group < context->GroupCount(); ++group)
             {
                 const CRegexMatchContext::Capture capture = context->Group(group);
-                found += capture.start == nullptr ? L" -"
-                                                  : L" {" + std::wstring(capture.start, capture.end) + L"}";
+                found += capture.start ? L" {" + std::wstring(capture.start, capture.end) + L"}" : L" -";
             }
         }
         ASSERT_NE(*end, nullptr);
