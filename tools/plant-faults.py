@@ -348,7 +348,7 @@ FAULTS = [
           "Body commits grow by half regardless of the announced length",
           "src/http/ResponseReading.cpp",
           "return announced != kNoLength && announced + 1 >= needed ? std::min(target, announced + 1) : target;",
-          "return target;"),
+          "return (void)announced, target;"),
     Fault("http.save-text-mode", "http", "SaveResponseToFile opens the file in text mode",
           "src/http/CWinHttpClient.cpp",
           "::_wfopen(filePath.c_str(), L\"wb\")",

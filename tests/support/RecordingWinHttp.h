@@ -18,7 +18,8 @@ namespace KelvraTest
 
 class RecordingWinHttp final : public KelvraHttp::WinHttpPlatform
 {
-    using Platform = KelvraHttp::WinHttpPlatform;
+    using P = KelvraHttp::WinHttpPlatform;
+    using Text = const wchar_t*;
 
 public:
     RecordingWinHttp() : m_previous(KelvraHttp::InstallPlatform(this)) {}
@@ -40,79 +41,74 @@ public:
     // When set, GetProxyForUrl answers these proxy and bypass lists (Wine refuses the look-up).
     std::vector<std::wstring> lookedUpProxy;
 
-    HINTERNET Open(const wchar_t* agent, DWORD access, const wchar_t* proxy, const wchar_t* bypass,
-                   DWORD flags) override
+    HINTERNET Open(Text agent, DWORD access, Text proxy, Text bypass, DWORD flags) override
     {
-        return Opened(Call(L"Open", &Platform::Open, agent, access, proxy, bypass, flags));
+        return Call(L"Open", &P::Open, agent, access, proxy, bypass, flags);
     }
     BOOL SetTimeouts(HINTERNET session, int resolve, int connect, int send, int receive) override
     {
-        return Call(L"SetTimeouts", &Platform::SetTimeouts, session, resolve, connect, send, receive);
+        return Call(L"SetTimeouts", &P::SetTimeouts, session, resolve, connect, send, receive);
     }
-    BOOL CrackUrl(const wchar_t* url, DWORD length, DWORD flags, URL_COMPONENTS* parts) override
+    BOOL CrackUrl(Text url, DWORD length, DWORD flags, URL_COMPONENTS* parts) override
     {
-        return Call(L"CrackUrl", &Platform::CrackUrl, url, length, flags, parts);
+        return Call(L"CrackUrl", &P::CrackUrl, url, length, flags, parts);
     }
-    HINTERNET Connect(HINTERNET session, const wchar_t* server, INTERNET_PORT port, DWORD reserved) override
+    HINTERNET Connect(HINTERNET session, Text server, INTERNET_PORT port, DWORD reserved) override
     {
-        return Opened(Call(L"Connect", &Platform::Connect, session, server, port, reserved));
+        return Call(L"Connect", &P::Connect, session, server, port, reserved);
     }
-    HINTERNET OpenRequest(HINTERNET connection, const wchar_t* verb, const wchar_t* path,
-                          const wchar_t* version, const wchar_t* referrer, const wchar_t** types,
-                          DWORD flags) override
+    HINTERNET OpenRequest(HINTERNET connection, Text verb, Text path, Text version, Text referrer,
+                          Text* types, DWORD flags) override
     {
-        return Opened(Call(L"OpenRequest", &Platform::OpenRequest, connection, verb, path, version, referrer,
-                           types, flags));
+        return Call(L"OpenRequest", &P::OpenRequest, connection, verb, path, version, referrer, types, flags);
     }
     // Records a proxy's access type and lists, a credential as length / 2 characters, or a number.
     BOOL SetOption(HINTERNET handle, DWORD option, void* buffer, DWORD length) override
     {
         const auto* proxy = static_cast<const WINHTTP_PROXY_INFO*>(buffer);
-        const auto* text = static_cast<const wchar_t*>(buffer);
         const bool credential =
             option == WINHTTP_OPTION_PROXY_USERNAME || option == WINHTTP_OPTION_PROXY_PASSWORD;
-        return Call(option == WINHTTP_OPTION_PROXY
-                        ? Text(L"SetOption 38", proxy->dwAccessType,
-                               Piece(static_cast<const wchar_t*>(proxy->lpszProxy)),
-                               Piece(static_cast<const wchar_t*>(proxy->lpszProxyBypass)))
-                    : credential ? Text(L"SetOption", option, std::wstring(text, length / 2))
-                                 : Text(L"SetOption", option, *static_cast<DWORD*>(buffer)),
-                    &Platform::SetOption, handle, option, buffer, length);
+        return Call(
+            option == WINHTTP_OPTION_PROXY ? Line(L"SetOption 38", proxy->dwAccessType,
+                                                  Text(proxy->lpszProxy), Text(proxy->lpszProxyBypass))
+            : credential ? Line(L"SetOption", option, std::wstring(static_cast<Text>(buffer), length / 2))
+                         : Line(L"SetOption", option, *static_cast<DWORD*>(buffer)),
+            &P::SetOption, handle, option, buffer, length);
     }
-    BOOL AddRequestHeaders(HINTERNET request, const wchar_t* headers, DWORD length, DWORD modifiers) override
+    BOOL AddRequestHeaders(HINTERNET request, Text headers, DWORD length, DWORD modifiers) override
     {
-        return Call(L"AddRequestHeaders", &Platform::AddRequestHeaders, request, headers, length, modifiers);
+        return Call(L"AddRequestHeaders", &P::AddRequestHeaders, request, headers, length, modifiers);
     }
-    BOOL SendRequest(HINTERNET request, const wchar_t* headers, DWORD headersLength, void* optional,
+    BOOL SendRequest(HINTERNET request, Text headers, DWORD headersLength, void* optional,
                      DWORD optionalLength, DWORD total, DWORD_PTR context) override
     {
-        return Call(L"SendRequest", &Platform::SendRequest, request, headers, headersLength, optional,
+        return Call(L"SendRequest", &P::SendRequest, request, headers, headersLength, optional,
                     optionalLength, total, context);
     }
     BOOL WriteData(HINTERNET request, const void* data, DWORD length, DWORD* written) override
     {
-        return Call(L"WriteData", &Platform::WriteData, request, data, length, written);
+        return Call(L"WriteData", &P::WriteData, request, data, length, written);
     }
     BOOL ReceiveResponse(HINTERNET request, void* reserved) override
     {
         const bool failing = Failing(L"ReceiveResponse");
         const DWORD error = m_lastError;
-        const BOOL received = Native(&Platform::ReceiveResponse, request, reserved);
+        const BOOL received = Native(&P::ReceiveResponse, request, reserved);
         m_lastError = failing ? error : m_lastError;
         return !failing && received;
     }
-    BOOL QueryHeaders(HINTERNET request, DWORD level, const wchar_t* name, void* buffer, DWORD* length,
+    BOOL QueryHeaders(HINTERNET request, DWORD level, Text name, void* buffer, DWORD* length,
                       DWORD* index) override
     {
-        return Call(L"QueryHeaders", &Platform::QueryHeaders, request, level, name, buffer, length, index);
+        return Call(L"QueryHeaders", &P::QueryHeaders, request, level, name, buffer, length, index);
     }
     BOOL QueryDataAvailable(HINTERNET request, DWORD* available) override
     {
-        return Call(L"QueryDataAvailable", &Platform::QueryDataAvailable, request, available);
+        return Call(L"QueryDataAvailable", &P::QueryDataAvailable, request, available);
     }
     BOOL ReadData(HINTERNET request, void* buffer, DWORD length, DWORD* read) override
     {
-        return Call(L"ReadData", &Platform::ReadData, request, buffer, length, read);
+        return Call(L"ReadData", &P::ReadData, request, buffer, length, read);
     }
     BOOL CloseHandle(HINTERNET handle) override
     {
@@ -123,17 +119,17 @@ public:
     BOOL GetIEProxyConfigForCurrentUser(WINHTTP_CURRENT_USER_IE_PROXY_CONFIG* config) override
     {
         const BOOL result =
-            Call(L"GetIEProxyConfigForCurrentUser", &Platform::GetIEProxyConfigForCurrentUser, config);
+            Call(L"GetIEProxyConfigForCurrentUser", &P::GetIEProxyConfigForCurrentUser, config);
         return HandedOut(result, {config->lpszAutoConfigUrl, config->lpszProxy, config->lpszProxyBypass});
     }
-    BOOL GetProxyForUrl(HINTERNET session, const wchar_t* url, WINHTTP_AUTOPROXY_OPTIONS* options,
+    BOOL GetProxyForUrl(HINTERNET session, Text url, WINHTTP_AUTOPROXY_OPTIONS* options,
                         WINHTTP_PROXY_INFO* info) override
     {
-        const std::wstring text = Text(L"GetProxyForUrl", url, options->dwFlags, options->dwAutoDetectFlags,
+        const std::wstring text = Line(L"GetProxyForUrl", url, options->dwFlags, options->dwAutoDetectFlags,
                                        options->lpszAutoConfigUrl, options->fAutoLogonIfChallenged);
         BOOL result = FALSE;
         if (lookedUpProxy.empty())
-            result = Call(text, &Platform::GetProxyForUrl, session, url, options, info);
+            result = Call(text, &P::GetProxyForUrl, session, url, options, info);
         else if ((result = !Failing(text)))
             *info = {WINHTTP_ACCESS_TYPE_NAMED_PROXY, Copy(lookedUpProxy[0]), Copy(lookedUpProxy[1])};
         return HandedOut(result, {info->lpszProxy, info->lpszProxyBypass});
@@ -147,14 +143,14 @@ public:
     int MultiByteToWideChar(UINT codePage, DWORD flags, const char* bytes, int count, wchar_t* text,
                             int length) override
     {
-        return Call(L"MultiByteToWideChar", &Platform::MultiByteToWideChar, codePage, flags, bytes, count,
-                    text, length);
+        return Call(L"MultiByteToWideChar", &P::MultiByteToWideChar, codePage, flags, bytes, count, text,
+                    length);
     }
     DWORD GetLastError() override { return m_lastError; }
 
 private:
     // Text in, or null; handles, buffers and output texts are left out.
-    static std::wstring Piece(const wchar_t* text) { return text != nullptr ? text : L"null"; }
+    static std::wstring Piece(Text text) { return text != nullptr ? text : L"null"; }
     static std::wstring Piece(const std::wstring& text) { return text; }
     static std::wstring Piece(const void*) { return L""; }
     static std::wstring Piece(wchar_t*) { return L""; }
@@ -163,7 +159,7 @@ private:
     {
         return std::to_wstring(value);
     }
-    template <typename... Args> static std::wstring Text(const std::wstring& name, Args... args)
+    template <typename... Args> static std::wstring Line(const std::wstring& name, Args... args)
     {
         std::wstring text = name;
         for (const std::wstring& piece : {Piece(args)...})
@@ -183,16 +179,20 @@ private:
         return false;
     }
     template <typename Result, typename... Params, typename... Args>
-    Result Native(Result (Platform::*method)(Params...), Args... args)
+    Result Native(Result (P::*method)(Params...), Args... args)
     {
         const Result result = (m_native.*method)(args...);
         m_lastError = m_native.GetLastError();
+        if constexpr (std::is_same_v<Result, HINTERNET>)
+            if (result != nullptr)
+                open.insert(result);
         return result;
     }
+    // The call recorded as name and its arguments (unless name holds them already) and forwarded.
     template <typename Result, typename... Params, typename... Args>
-    Result Call(const std::wstring& name, Result (Platform::*method)(Params...), Args... args)
+    Result Call(const std::wstring& name, Result (P::*method)(Params...), Args... args)
     {
-        return Failing(name.find(L' ') == std::wstring::npos ? Text(name, args...) : name)
+        return Failing(name.find(L' ') == std::wstring::npos ? Line(name, args...) : name)
                    ? Result{}
                    : Native(method, args...);
     }
@@ -209,12 +209,6 @@ private:
                 handedOut.insert(text);
         return result;
     }
-    HINTERNET Opened(HINTERNET handle)
-    {
-        if (handle != nullptr)
-            open.insert(handle);
-        return handle;
-    }
 
     struct Fault
     {
@@ -222,8 +216,8 @@ private:
         DWORD error;
         int first, times;
     };
-    Platform& m_native = KelvraHttp::NativePlatform();
-    Platform* m_previous;
+    P& m_native = KelvraHttp::NativePlatform();
+    P* m_previous;
     std::map<std::wstring, int> m_seen;
     std::vector<Fault> m_faults;
     std::set<HGLOBAL> handedOut;
