@@ -23,7 +23,7 @@
 using KelvraStrings::Strings;
 
 std::wstring ServerUrl(const std::wstring& path, const std::wstring& listener); // HttpClientTest.cpp
-void Prepare(CWinHttpClient& client, const std::wstring& proxy);                 // HttpClientTest.cpp
+void Prepare(CWinHttpClient& client, const std::wstring& proxy);                // HttpClientTest.cpp
 
 namespace
 {
