@@ -23,6 +23,7 @@
 using KelvraStrings::Strings;
 
 std::wstring ServerUrl(const std::wstring& path, const std::wstring& listener); // HttpClientTest.cpp
+void Prepare(CWinHttpClient& client, const std::wstring& proxy);                // HttpClientTest.cpp
 
 namespace
 {
@@ -72,7 +73,7 @@ template <typename Run> std::optional<std::wstring> Failing(Run&& run)
     return thrown;
 }
 
-// A POST with a body, an extra header and a cookie, for a response with a charset, two cookies, a
+// A POST prepared as in HttpClientTest.cpp, for a response with a charset, two cookies, a
 // location and a body: its fields, or after a failure its error and whether the same client's
 // next request succeeds.
 std::wstring SendRequest()
@@ -81,9 +82,7 @@ std::wstring SendRequest()
         ServerUrl(L"/respond?header=Content-Type:%20text/plain;%20charset=utf-8&header=Set-Cookie:%20a=1"
                   L"&header=Set-Cookie:%20b=2&header=Location:%20/next&body=%C3%A9t%C3%A9",
                   L"http"));
-    client.SetAdditionalRequestHeaders(L"X-A: 1");
-    client.SetAdditionalRequestCookies(L"c=1");
-    client.SetAdditionalDataToSend(reinterpret_cast<const unsigned char*>("k=v"), 3);
+    Prepare(client, L"");
     bool sent = false;
     if (const auto thrown = Failing([&] { sent = client.SendHttpRequest(L"POST", true); }))
         return *thrown;

@@ -114,9 +114,9 @@ private:
 
 testing::Environment* const traceSession = testing::AddGlobalTestEnvironment(new TraceSession);
 
-size_t CountCalls(const std::vector<std::wstring>& calls, const std::wstring& prefix, size_t to = SIZE_MAX)
+size_t CountCalls(const std::vector<std::wstring>& calls, const std::wstring& prefix)
 {
-    return std::count_if(calls.begin(), calls.begin() + std::min(to, calls.size()),
+    return std::count_if(calls.begin(), calls.end(),
                          [&](const std::wstring& call) { return call.rfind(prefix, 0) == 0; });
 }
 
@@ -143,16 +143,16 @@ bool BodyEndsInZero(CWinHttpClient& client)
     return body == nullptr || body[client.GetRawResponseReceivedContentLength()] == 0;
 }
 
+} // namespace
+
 // An extra header, a cookie, the body "k=v" (for a POST) and, with a proxy, its user name and password.
-void Prepare(CWinHttpClient& client, const std::wstring& proxy = L"")
+void Prepare(CWinHttpClient& client, const std::wstring& proxy)
 {
     client.SetAdditionalRequestHeaders(L"X-A: 1");
     client.SetAdditionalRequestCookies(L"c=1");
     client.SetAdditionalDataToSend(reinterpret_cast<const unsigned char*>("k=v"), 3);
     client.SetProxy(proxy), client.SetProxyUsername(L"u"), client.SetProxyPassword(L"p");
 }
-
-} // namespace
 
 // One fresh client per row, with the extra header "X-One: 1" and the cookies "a=1; b=2"; a POST
 // carries the body "k=v". The row's setup runs first, then its before path is fetched the row's
@@ -200,7 +200,6 @@ TEST(HttpExchanges, ResultsAsTheClientShowsThem)
          false, L"true 0 () 200 [] 1/1 <> {} 1"},
         {"CutHtmlWithoutRedirectsSentOnce", nullptr, L"/respond?key=direct&body=%3Chtml%3Ecut",
          L"/count?key=direct", L"GET", true, L"true 0 () 200 [] 1/1 <> {} 1"},
-        {"RedirectFollowed", nullptr, L"", moved, L"GET", false, L"true 0 () 200 [] 5/5 <> {} moved"},
         {"RedirectReturned", nullptr, L"", moved, L"GET", true,
          L"true 0 () 302 [] 0/0 </respond?body=moved> {} "},
         {"ContentLocationIsNoLocation", nullptr, L"",
@@ -256,7 +255,6 @@ TEST(HttpExchanges, LargeBodySavedWithProgress)
 {
     const std::wstring file = KelvraTest::DataPath(L"large_body.bin");
     CWinHttpClient client(ServerUrl(L"/respond"), &RecordProgress);
-    EXPECT_FALSE(client.SaveResponseToFile(file));
     ASSERT_TRUE(client.SendHttpRequest(L"GET", false));
     EXPECT_FALSE(client.SaveResponseToFile(file));
     EXPECT_FALSE(std::filesystem::exists(file));
@@ -369,21 +367,16 @@ INF Destructing the Http client
 TEST(HttpHostileServers, EveryReplyEndsInTimeWithNothingOpen)
 {
     const std::pair<const wchar_t*, std::wstring> rows[] = {
-        // 2,048 lines of 512 bytes. (Wine stores header lines in time of the square of their
-        // count: 16,384 lines of 64 bytes took it 30 s.)
-        {L"many-lines", L"true 0 200 2/2 h1048614 c0 ok"},
         // Wine keeps the first 1,460 bytes or so of a header line and drops the rest of it.
         {L"long-line", L"true 0 200 2/2 h1499 c0 ok"},
         // 20,000 Set-Cookie lines: every value is kept ("c00000=0; ...; c19999=19999;").
         {L"cookies", L"true 0 200 2/2 h508928 c268889 ok"},
-        // A length beyond 32 bits counts as the largest one; the body ends at the close.
+        // A length beyond 32 (here 64) bits counts as the largest one; the body ends at the close.
         {L"huge-length", L"true 0 200 5/4294967295 h57 c0 short"},
-        {L"five-gib", L"true 0 200 5/4294967295 h47 c0 short"},
         // Wine takes a reply cut in its headers for one without a body.
         {L"cut-headers", L"true 0 200 0/0 h17 c0 "},
         {L"cut-body", L"true 0 200 7/1000 h41 c0 partial"},
         {L"garbage-status", L"false 12152  0/0 h0 c0 "},
-        {L"empty", L"false 12152  0/0 h0 c0 "},
         // The headers, then 4 s of silence: the receive time-out ends the body's wait, Wine
         // answering 10060 (WSAETIMEDOUT) where Windows answers 12002.
         {L"stall", L"false 10060 200 0/100 h40 c0 "},
