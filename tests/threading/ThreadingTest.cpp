@@ -41,15 +41,18 @@ public:
     using CLock::Init;
 };
 
-TEST(Lock, HoldingIsCountedPerThread)
+TEST(Lock, HoldingIsCountedPerThreadAndInitOfTheHeldSectionOrOfNullKeepsIt)
 {
-    CLock lock;
+    ICritSec* section = new KelvraCsLocks::CCritSec();
+    AdoptingLock lock(section);
     lock.Lock();
     lock.Lock();
+    lock.Init(section);
+    lock.Init(nullptr);
     ASSERT_NE(0, lock.TryLock()) << "TryLock by the holder adds a level";
     for (int levels = 3; levels > 0; --levels)
     {
-        EXPECT_EQ(0, TryLockElsewhere(lock)) << levels << " levels held";
+        EXPECT_EQ(0, TryLockElsewhere(lock)) << levels << " levels held, or Init started the section afresh";
         lock.Unlock();
     }
     EXPECT_EQ(1, TryLockElsewhere(lock));
@@ -65,17 +68,6 @@ TEST(Lock, LockWaitsForTheHolderToRelease)
     lock.Unlock();
     other.get();
     EXPECT_EQ(1, TryLockElsewhere(lock)) << "the scope lock was not released";
-}
-
-TEST(Lock, InitOfTheHeldSectionOrOfNullKeepsItAndItsHolder)
-{
-    ICritSec* section = new KelvraCsLocks::CCritSec();
-    AdoptingLock lock(section);
-    lock.Lock();
-    lock.Init(section);
-    lock.Init(nullptr);
-    EXPECT_EQ(0, TryLockElsewhere(lock)) << "Init started the held section afresh";
-    lock.Unlock();
 }
 
 // Three reads in a row: '1' set, '0' clear.
