@@ -70,27 +70,25 @@ TEST(Lock, LockWaitsForTheHolderToRelease)
     EXPECT_EQ(1, TryLockElsewhere(lock)) << "the scope lock was not released";
 }
 
-// Three reads in a row: '1' set, '0' clear.
-std::string Reads(const CGlobalBooleanFx2& flag)
-{
-    return {flag ? '1' : '0', flag ? '1' : '0', flag ? '1' : '0'};
-}
-
 TEST(FlagValue, FollowsTheResetModeOfItsClass)
 {
     CGlobalBooleanFx2 global(nullptr);
     CInterlockedBooleanFx2 interlocked;
     CAutoBoolean automatic;
+    // Three reads in a row: '1' set, '0' clear.
+    const auto reads = [](const CGlobalBooleanFx2& flag) -> std::string {
+        return {flag ? '1' : '0', flag ? '1' : '0', flag ? '1' : '0'};
+    };
     const std::pair<CGlobalBooleanFx2*, const char*> cases[] = {
         {&global, "111"}, {&interlocked, "111"}, {&automatic, "100"}};
     for (const auto& [flag, afterSet] : cases)
     {
-        EXPECT_EQ("000", Reads(*flag)) << afterSet << ", new";
+        EXPECT_EQ("000", reads(*flag)) << afterSet << ", new";
         *flag = true;
-        EXPECT_EQ(afterSet, Reads(*flag)) << afterSet << ", set";
+        EXPECT_EQ(afterSet, reads(*flag)) << afterSet << ", set";
         *flag = true;
         *flag = false;
-        EXPECT_EQ("000", Reads(*flag)) << afterSet << ", cleared";
+        EXPECT_EQ("000", reads(*flag)) << afterSet << ", cleared";
     }
 }
 
