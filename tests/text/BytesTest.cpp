@@ -37,12 +37,11 @@ void operator delete(void* block, std::size_t) noexcept
     std::free(block);
 }
 
-TEST(Bytes, ZeroSizeGivesUniqueNonNullPointersAndBothConversionsAgree)
+TEST(Bytes, ZeroSizeGivesUniqueNonNullPointers)
 {
     Bytes a(0), b = 0u; // converts implicitly from a size, as documented
     EXPECT_NE(static_cast<char*>(a), nullptr);
     EXPECT_NE(static_cast<char*>(a), static_cast<char*>(b));
-    EXPECT_EQ(static_cast<void*>(static_cast<char*>(a)), static_cast<void*>(static_cast<unsigned char*>(a)));
 }
 
 TEST(Bytes, SharersKeepTheBlockUntilTheLastGoes)

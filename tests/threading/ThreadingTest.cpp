@@ -41,15 +41,18 @@ public:
     using CLock::Init;
 };
 
-TEST(Lock, HoldingIsCountedPerThread)
+TEST(Lock, HoldingIsCountedPerThreadAndInitOfTheHeldSectionOrOfNullKeepsIt)
 {
-    CLock lock;
+    ICritSec* section = new KelvraCsLocks::CCritSec();
+    AdoptingLock lock(section);
     lock.Lock();
     lock.Lock();
+    lock.Init(section);
+    lock.Init(nullptr);
     ASSERT_NE(0, lock.TryLock()) << "TryLock by the holder adds a level";
     for (int levels = 3; levels > 0; --levels)
     {
-        EXPECT_EQ(0, TryLockElsewhere(lock)) << levels << " levels held";
+        EXPECT_EQ(0, TryLockElsewhere(lock)) << levels << " levels held, or Init started the section afresh";
         lock.Unlock();
     }
     EXPECT_EQ(1, TryLockElsewhere(lock));
@@ -67,38 +70,25 @@ TEST(Lock, LockWaitsForTheHolderToRelease)
     EXPECT_EQ(1, TryLockElsewhere(lock)) << "the scope lock was not released";
 }
 
-TEST(Lock, InitOfTheHeldSectionOrOfNullKeepsItAndItsHolder)
-{
-    ICritSec* section = new KelvraCsLocks::CCritSec();
-    AdoptingLock lock(section);
-    lock.Lock();
-    lock.Init(section);
-    lock.Init(nullptr);
-    EXPECT_EQ(0, TryLockElsewhere(lock)) << "Init started the held section afresh";
-    lock.Unlock();
-}
-
-// Three reads in a row: '1' set, '0' clear.
-std::string Reads(const CGlobalBooleanFx2& flag)
-{
-    return {flag ? '1' : '0', flag ? '1' : '0', flag ? '1' : '0'};
-}
-
 TEST(FlagValue, FollowsTheResetModeOfItsClass)
 {
     CGlobalBooleanFx2 global(nullptr);
     CInterlockedBooleanFx2 interlocked;
     CAutoBoolean automatic;
+    // Three reads in a row: '1' set, '0' clear.
+    const auto reads = [](const CGlobalBooleanFx2& flag) -> std::string {
+        return {flag ? '1' : '0', flag ? '1' : '0', flag ? '1' : '0'};
+    };
     const std::pair<CGlobalBooleanFx2*, const char*> cases[] = {
         {&global, "111"}, {&interlocked, "111"}, {&automatic, "100"}};
     for (const auto& [flag, afterSet] : cases)
     {
-        EXPECT_EQ("000", Reads(*flag)) << afterSet << ", new";
+        EXPECT_EQ("000", reads(*flag)) << afterSet << ", new";
         *flag = true;
-        EXPECT_EQ(afterSet, Reads(*flag)) << afterSet << ", set";
+        EXPECT_EQ(afterSet, reads(*flag)) << afterSet << ", set";
         *flag = true;
         *flag = false;
-        EXPECT_EQ("000", Reads(*flag)) << afterSet << ", cleared";
+        EXPECT_EQ("000", reads(*flag)) << afterSet << ", cleared";
     }
 }
 
