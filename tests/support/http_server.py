@@ -97,6 +97,15 @@ class HostileHandler(socketserver.BaseRequestHandler):
         reply, wait = reply if isinstance(reply, tuple) else (reply, 0)
         self.request.sendall(reply)
         time.sleep(wait)
+        # A lingering close: what the client still sends is read first, so that the close never
+        # resets the connection while the reply is on its way (seen as 10054 or 12152 under load).
+        self.request.shutdown(socket.SHUT_WR)
+        self.request.settimeout(5)
+        try:
+            while self.request.recv(65536):
+                pass
+        except OSError:
+            pass
 
 
 def serve(state_dir):
