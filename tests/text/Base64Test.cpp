@@ -15,8 +15,9 @@ TEST(Base64, EncodesAndDecodesReferenceVectors)
     const std::string nuls(3, '\0'),
         alphabet = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+//w==";
     const std::pair<std::string, std::string> vectors[] = {
-        {"", ""},       {"f", "Zg=="},     {"foo", "Zm9v"}, {"foob", "Zm9vYg=="}, {"foobar", "Zm9vYmFy"},
-        {nuls, "AAAA"}, {long49, alphabet}};
+        {"", ""},        {"f", "Zg=="},        {"fo", "Zm8="},
+        {"foo", "Zm9v"}, {"foob", "Zm9vYg=="}, {"foobar", "Zm9vYmFy"},
+        {nuls, "AAAA"},  {long49, alphabet}};
     for (const auto& [plain, encoded] : vectors)
     {
         const auto* bytes = reinterpret_cast<const unsigned char*>(plain.data());
