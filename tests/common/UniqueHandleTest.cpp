@@ -2,7 +2,6 @@
 
 #include <gtest/gtest.h>
 
-#include <optional>
 #include <vector>
 
 namespace
@@ -36,13 +35,3 @@ TEST(UniqueHandle, ClosesEachValueOnceAndNeverOneHandedOn)
     EXPECT_EQ(g_closed, (std::vector<int>{3, 1, 4, 6}));
 }
 
-TEST(UniqueHandle, ClosesARealKernelHandle)
-{
-    std::optional<Kelvra::UniqueEvent> event(std::in_place, ::CreateEventW(nullptr, TRUE, FALSE, nullptr));
-    const HANDLE raw = event->get();
-    DWORD flags = 0;
-    ASSERT_TRUE(::GetHandleInformation(raw, &flags));
-    event.reset();
-    EXPECT_FALSE(::GetHandleInformation(raw, &flags));
-    EXPECT_EQ(::GetLastError(), static_cast<DWORD>(ERROR_INVALID_HANDLE));
-}

@@ -5,6 +5,7 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
 #include <climits>
 #include <clocale>
 #include <cmath>
@@ -152,19 +153,13 @@ TEST(INIReaderLookup, KeyIsSectionDotNameWithAsciiLettersLoweredAndItsFirstNonEm
         ReadIni("top = 1\n[s]\nname = one\nname = two\n[t]\n[s]\nNAME = three\n[Caf\xC9]\n\xE9t\xE9 = 2\n"
                 "[e]\nlate =\nlate = given\nfilled =\n  text\nkept = a\n  b\n"
                 "[ spaced ]\nk = v\n[a.b]\nc = section\n[a]\nb.c = name\n");
-    const auto get = [&](const wchar_t* section, const wchar_t* key)
-    { return reader.Get(section, key, L"-"); };
-    EXPECT_EQ(get(L"", L"top"), L"1");
-    EXPECT_EQ(get(L"s", L"top"), L"-");
-    EXPECT_EQ(get(L"S", L"Name"), L"one");
-    EXPECT_EQ(get(L"CAF\u00c9", L"\u00e9T\u00e9"), L"2");
-    EXPECT_EQ(get(L"caf\u00e9", L"\u00e9t\u00e9"), L"-");
-    EXPECT_EQ(get(L"e", L"late"), L"given");
-    EXPECT_EQ(get(L"e", L"filled"), L"text");
-    EXPECT_EQ(get(L"e", L"kept"), L"a");
-    EXPECT_EQ(get(L" spaced ", L"k"), L"v");
-    EXPECT_EQ(get(L"spaced", L"k"), L"-");
-    EXPECT_EQ(get(L"a", L"b.c"), L"section"); // one key for both: the first value wins
+    // "a" "b.c" and "a.b" "c" make one key: the first value wins.
+    const std::array<const wchar_t*, 3> lookups[] = {
+        {L"", L"top", L"1"}, {L"s", L"top", L"-"}, {L"S", L"Name", L"one"}, {L"e", L"late", L"given"},
+        {L"CAF\u00c9", L"\u00e9T\u00e9", L"2"}, {L"caf\u00e9", L"\u00e9t\u00e9", L"-"}, {L"e", L"kept", L"a"},
+        {L"e", L"filled", L"text"}, {L" spaced ", L"k", L"v"}, {L"spaced", L"k", L"-"}, {L"a", L"b.c", L"section"}};
+    for (const auto& [section, key, value] : lookups)
+        EXPECT_EQ(reader.Get(section, key, L"-"), value) << section << "." << key;
 }
 
 TEST(INIReaderFile, UnreadableFileGivesMinusOneAndCopiesCarryValuesAndResult)

@@ -1,22 +1,16 @@
 // Operations run once for every heap allocation they make, with that allocation alone failing.
-// This file replaces the program's global operator new and delete, counting the blocks in use.
 #include "KelvraHttp.h"
-#include "KelvraIni.h"
 #include "KelvraStrings.h"
 #include "KelvraTrace.h"
 
-#include "common/UniqueHandle.h"
 #include "http/HeaderPatterns.h"
 #include "http/pattern/PatternExtraction.h"
 #include "http/pattern/RegexPattern.h"
-#include "support/TestData.h"
+#include "support/CountedHeap.h"
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <atomic>
-#include <cstdio>
-#include <cstdlib>
 #include <new>
 #include <optional>
 
@@ -28,38 +22,14 @@ void Prepare(CWinHttpClient& client, const std::wstring& proxy);                
 namespace
 {
 
-std::atomic<long long> liveBlocks{0};
-// Allocations to go before the chosen one, which fails when this reaches 0 from 1; 0: none chosen.
-std::atomic<long long> countdown{0};
+using KelvraTest::liveBlocks;
 long long chosen = 0; // the allocation to fail, 0 for none
 bool failed = false;  // whether it came
-
-} // namespace
-
-// The library's other forms (arrays, nothrow) forward to these.
-void* operator new(std::size_t size)
-{
-    void* block = countdown.load() > 0 && countdown.fetch_sub(1) == 1 ? nullptr : std::malloc(size + 1);
-    liveBlocks += block != nullptr ? 1 : 0;
-    return block != nullptr ? block : throw std::bad_alloc();
-}
-void operator delete(void* block) noexcept
-{
-    if (block != nullptr)
-        --liveBlocks, std::free(block);
-}
-void operator delete(void* block, std::size_t) noexcept
-{
-    operator delete(block);
-}
-
-namespace
-{
 
 // Runs run() with the chosen allocation failing; a bad_alloc leaving it makes the outcome "bad_alloc".
 template <typename Run> std::optional<std::wstring> Failing(Run&& run)
 {
-    countdown = chosen;
+    KelvraTest::failCountdown = chosen;
     std::optional<std::wstring> thrown;
     try
     {
@@ -69,7 +39,7 @@ template <typename Run> std::optional<std::wstring> Failing(Run&& run)
     {
         thrown = L"bad_alloc";
     }
-    failed = chosen > 0 && countdown.exchange(0) == 0;
+    failed = chosen > 0 && KelvraTest::failCountdown.exchange(0) == 0;
     return thrown;
 }
 
@@ -92,22 +62,6 @@ std::wstring SendRequest()
                                   client.GetResponseLocation().c_str(), client.GetResponseContent().c_str())
                 : Strings::Format(L"false %u, then %s", error,
                                   client.SendHttpRequest(L"POST", true) ? L"true" : L"false");
-}
-
-// Three sections of pairs, one continued; then whether the file is closed (it opens unshared).
-std::wstring ReadIni()
-{
-    const std::wstring path = KelvraTest::DataPath(L"allocation.ini");
-    std::optional<INIReader> reader;
-    const auto thrown = Failing([&] { reader.emplace(path); });
-    const Kelvra::UniqueFileHandle alone(
-        ::CreateFileW(path.c_str(), GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr));
-    return (thrown ? *thrown
-                   : Strings::Format(L"%d %s %d %s", reader->ParseError(),
-                                     reader->Get(L"First", L"name", L"").c_str(),
-                                     reader->GetInteger(L"second", L"Number", 0),
-                                     reader->Get(L"third", L"text", L"").c_str())) +
-           (alone ? L"" : L" (left open)");
 }
 
 // Compiles a pattern and matches it on a text that takes the stack far beyond its first 4 entries.
@@ -156,16 +110,9 @@ TEST(AllocationFailure, EveryAllocationOfAnOperationFailingInTurn)
 {
     const std::tuple<const char*, std::wstring (*)(), std::vector<std::wstring>> operations[] = {
         {"SendHttpRequest", &SendRequest, {L"false 8, then true"}},
-        {"INIReader", &ReadIni, {L"bad_alloc"}},
         {"CRegexPattern", &CompileAndMatch, {L"compile error 1", L"out of memory"}},
         {"ExtractPatternGroups", &ExtractCookies, {L"false"}},
     };
-    std::FILE* file = _wfopen(KelvraTest::DataPath(L"allocation.ini").c_str(), L"w");
-    ASSERT_NE(file, nullptr);
-    std::fputs("[first]\nname = the first value\n[second]\nnumber = 0x10\nother = another value\n"
-               "[third]\ntext =\n  continued on the next line\n",
-               file);
-    std::fclose(file);
     // Only error lines are written meanwhile: the allocations of the others would multiply the runs.
     Debug::lock();
     const Debug::Levels level = std::exchange(Debug::_lvl, Debug::lvlError);
@@ -192,5 +139,4 @@ TEST(AllocationFailure, EveryAllocationOfAnOperationFailingInTurn)
     Debug::lock();
     Debug::_lvl = level;
     Debug::unlock();
-    _wremove(KelvraTest::DataPath(L"allocation.ini").c_str());
 }

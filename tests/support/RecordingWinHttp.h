@@ -1,7 +1,6 @@
-// A WinHTTP binding for the HTTP client's tests, in force while it lives: it forwards every call
-// to the native binding, records it as text (its name and the arguments that are text or
-// numbers: "SetTimeouts 0 60000 30000 30000"), counts open handles and handed-out proxy texts,
-// and fails the calls it is told to.
+// A WinHTTP binding in force while it lives: it forwards every call to the native binding, records
+// it with its text and number arguments ("SetTimeouts 0 60000 30000 30000"), counts open handles
+// and handed-out proxy texts, and fails the calls it is told to.
 #pragma once
 
 #include "http/WinHttpPlatform.h"

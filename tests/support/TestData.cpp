@@ -2,9 +2,10 @@
 
 #include <gtest/gtest.h>
 
-#include <cstdio>
 #include <cstdlib>
-#include <memory>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
 
 namespace KelvraTest
 {
@@ -12,28 +13,15 @@ namespace KelvraTest
 std::wstring DataPath(const std::wstring& name)
 {
     const wchar_t* folder = _wgetenv(L"KELVRA_TEST_DATA");
-    if (folder == nullptr)
-    {
-        ADD_FAILURE() << "KELVRA_TEST_DATA is not set";
-        return name;
-    }
-    return std::wstring(folder) + L"\\" + name;
+    EXPECT_NE(folder, nullptr) << "KELVRA_TEST_DATA is not set";
+    return folder != nullptr ? std::wstring(folder) + L"\\" + name : name;
 }
 
 std::string ReadBinaryFile(const std::wstring& path)
 {
-    std::unique_ptr<FILE, int (*)(FILE*)> file(_wfopen(path.c_str(), L"rb"), &std::fclose);
-    if (!file)
-    {
-        ADD_FAILURE() << "cannot open a file the test needs";
-        return std::string();
-    }
-    std::string content;
-    char buffer[65536];
-    size_t got;
-    while ((got = std::fread(buffer, 1, sizeof(buffer), file.get())) > 0)
-        content.append(buffer, got);
-    return content;
+    std::ifstream file(std::filesystem::path(path), std::ios::binary);
+    EXPECT_TRUE(file.is_open()) << "cannot open a file the test needs";
+    return std::string(std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>());
 }
 
 } // namespace KelvraTest

@@ -36,13 +36,6 @@ TEST(StringsToString, WritesDecimalIntegersAndWidensEachByteUpToTheFirstNul)
     EXPECT_EQ(Strings::ToString(std::string("ab\0cd", 5)), L"ab");
 }
 
-TEST(StringsToLower, LowersAsciiLettersInPlaceOnly)
-{
-    std::wstring text = L"MiXeD \u00c4\u00c9 Z@[`";
-    EXPECT_EQ(Strings::ToLower(text), L"mixed \u00c4\u00c9 z@[`");
-    EXPECT_EQ(text, L"mixed \u00c4\u00c9 z@[`");
-}
-
 TEST(StringsPadd, PutsZerosInFrontOfTheWholeText)
 {
     const std::tuple<int, int, const wchar_t*> cases[] = {{7, 2, L"07"},   {0, 2, L"00"}, {123, 2, L"123"},

@@ -92,16 +92,6 @@ TEST(FlagValue, FollowsTheResetModeOfItsClass)
     }
 }
 
-TEST(FlagAssignment, CopiesTheValueNotTheEvent)
-{
-    CInterlockedBooleanFx2 source, target;
-    source = true;
-    target = source;
-    EXPECT_TRUE(source == target) << "the value was not copied, or the manual source lost it";
-    source = false;
-    EXPECT_TRUE(target) << "the target is tied to the source";
-}
-
 TEST(FlagWait, TimesOutOnAClearFlagAndNegativeWaitsUntilAnotherThreadSetsIt)
 {
     CInterlockedBooleanFx2 flag;

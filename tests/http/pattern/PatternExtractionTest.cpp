@@ -1,17 +1,16 @@
 // ExtractPatternGroups, TrimChars and AppendCookies, and the client's header patterns on a block
 // shaped as WinHTTP reports it: a status line, lines ended by CR LF in the server's case, a blank line.
-#include "http/pattern/PatternTestSupport.h"
-
 #include "http/HeaderPatterns.h"
 #include "http/ResponseText.h"
+#include "http/pattern/PatternExtraction.h"
 #include "http/pattern/RegexException.h"
 
 #include <gmock/gmock.h>
 
+#include <tuple>
 #include <utility>
 
 using namespace KelvraHeaderPatterns;
-using namespace KelvraTest;
 
 TEST(ExtractPatternGroups, RefusesBadInputAndThrowsForAPatternWithoutGroup)
 {
@@ -34,7 +33,7 @@ TEST(ExtractPatternGroups, CollectsGroupZeroOfEveryMatchOnce)
     const std::wstring block = L"HTTP/1.1 302 Found\r\nContent-Type: text/html; Charset=iso-8859-1\r\n"
                                L"content-length: 0\r\nLocation: 42abc\r\nSet-Cookie: sid=1; Path=/\r\n"
                                L"SET-COOKIE: SID=1; PATH=/\r\nSet-Cookie:\t theme=dark\r\n\r\n";
-    ExpectExtractions({
+    const std::vector<std::tuple<std::wstring, std::wstring, std::vector<std::wstring>>> rows = {
         {L"{[0-9]+}", L"a1b22c1d333", {L"1", L"22", L"333"}},
         {L"{a}{b}", L"abab", {L"a"}},
         // Equal ignoring case: the first spelling stays.
@@ -58,7 +57,13 @@ TEST(ExtractPatternGroups, CollectsGroupZeroOfEveryMatchOnce)
         {kCookies, L"Set-Cookie: x=1\r\r\nSet-Cookie: last=1", {L"x=1"}},
         // The text ends at its first NUL.
         {kCookies, std::wstring(L"Set-Cookie: a=1\r\n\0Set-Cookie: b=2\r\n", 35), {L"a=1"}},
-    });
+    };
+    for (const auto& [pattern, text, entries] : rows)
+    {
+        std::vector<std::wstring> results{L"left over"};
+        EXPECT_TRUE(ExtractPatternGroups(pattern, text, results));
+        EXPECT_EQ(results, entries) << testing::PrintToString(pattern) << " on " << testing::PrintToString(text);
+    }
 }
 
 TEST(CookieText, ValuesTrimmedJoinedWithABlankAndClosedWithASemicolon)

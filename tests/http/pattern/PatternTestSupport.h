@@ -3,7 +3,6 @@
 // stalling the program or taking all memory; the worker shares what it uses, as it may outlive the row.
 #pragma once
 
-#include "http/pattern/PatternExtraction.h"
 #include "http/pattern/RegexPattern.h"
 
 #include <gtest/gtest.h>
@@ -15,7 +14,6 @@
 #include <memory>
 #include <string>
 #include <thread>
-#include <tuple>
 #include <vector>
 
 namespace KelvraTest
@@ -66,20 +64,6 @@ inline void ExpectMatches(const std::vector<MatchRow>& rows)
         ASSERT_NE(*end, nullptr);
         EXPECT_LE(*end, textEnd + (found == L"none" ? 0 : 1));
         EXPECT_EQ(found, expected);
-    }
-}
-
-// A pattern, a text, and the entries ExtractPatternGroups should give.
-using ExtractionRow = std::tuple<std::wstring, std::wstring, std::vector<std::wstring>>;
-
-inline void ExpectExtractions(const std::vector<ExtractionRow>& rows)
-{
-    for (const auto& [pattern, text, entries] : rows)
-    {
-        std::vector<std::wstring> results{L"left over"};
-        EXPECT_TRUE(ExtractPatternGroups(pattern, text, results));
-        EXPECT_EQ(results, entries) << "pattern " << testing::PrintToString(pattern) << " text "
-                                    << testing::PrintToString(text);
     }
 }
 

@@ -1,0 +1,14 @@
+// The global operator new and delete of a test program that links CountedHeap.cpp: they count the
+// blocks in use and can fail one chosen allocation. The other forms (arrays, nothrow) forward to them.
+#pragma once
+
+#include <atomic>
+
+namespace KelvraTest
+{
+
+extern std::atomic<long long> liveBlocks;
+// Allocations to go before the chosen one, which fails when this reaches 0 from 1; 0: none chosen.
+extern std::atomic<long long> failCountdown;
+
+} // namespace KelvraTest
