@@ -50,6 +50,7 @@ SUBSYSTEM_TESTS = {
     "threading": ["threading"],
     "ini": ["config"],
     "eventlog": ["eventlog", "eventlog.entries"],
+    "handles": ["text", "trace", "config", "eventlog", "threading", "http"],
 }
 
 Fault = collections.namedtuple("Fault", "id subsystem what file find replace")
@@ -493,6 +494,19 @@ FAULTS = [
           "src/eventlog/COSEventLog.cpp",
           "EVENTLOG_ERROR_TYPE | EVENTLOG_WARNING_TYPE | EVENTLOG_INFORMATION_TYPE;",
           "EVENTLOG_ERROR_TYPE | EVENTLOG_WARNING_TYPE;"),
+    # Handle owners
+    Fault("handles.move-keeps-source", "handles", "A moved owner keeps its value and closes it again",
+          "src/common/UniqueHandle.h",
+          "UniqueHandle(UniqueHandle&& other) noexcept : m_value(other.release()) {}",
+          "UniqueHandle(UniqueHandle&& other) noexcept : m_value(other.get()) {}"),
+    Fault("handles.move-assignment-leaks", "handles", "Move assignment drops the value it held without closing it",
+          "src/common/UniqueHandle.h",
+          "            reset(other.release());",
+          "            m_value = other.release();"),
+    Fault("handles.put-keeps-old", "handles", "put() hands out the field without closing what it held",
+          "src/common/UniqueHandle.h",
+          "    pointer* put() noexcept\n    {\n        reset();\n",
+          "    pointer* put() noexcept\n    {\n"),
 ]
 
 
