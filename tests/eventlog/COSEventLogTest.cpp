@@ -1,4 +1,5 @@
 #include "KelvraEventLog.h"
+#include "eventlog/EventMessage.h"
 
 #include <gtest/gtest.h>
 
@@ -43,6 +44,17 @@ Values Registered(unsigned long categories)
     return values;
 }
 
+// The formatted message, or "(refused)" with the buffer emptied.
+std::wstring Message(const wchar_t* format, ...)
+{
+    wchar_t buffer[Kelvra::kEventMessageCapacity];
+    va_list args;
+    va_start(args, format);
+    const bool formatted = Kelvra::FormatEventMessage(buffer, format, args);
+    va_end(args);
+    return formatted ? buffer : (buffer[0] == L'\0' ? L"(refused)" : L"(refused but not emptied)");
+}
+
 // Every test leaves the registry as it found it.
 class EventLog : public testing::Test
 {
@@ -83,4 +95,16 @@ TEST_F(EventLog, NamesThatAreNoSourceKeyOfTheirOwnAreRefused)
         EXPECT_EQ(m_log.AddEventSource(name, 3), static_cast<unsigned long>(ERROR_INVALID_PARAMETER));
         EXPECT_EQ(m_log.RemoveEventSource(name), static_cast<unsigned long>(ERROR_INVALID_PARAMETER));
     }
+}
+
+TEST(EventMessage, ExpandsArgumentsWithMicrosoftRulesCutTo4095Characters)
+{
+    EXPECT_EQ(Message(L"%s failed: %d (%hs)", L"backup", 5, "denied"), L"backup failed: 5 (denied)");
+    EXPECT_EQ(Message(L""), L"");
+    EXPECT_EQ(Message(nullptr), L"(refused)");
+    const std::wstring text(5000, L'x');
+    EXPECT_EQ(Message(L"%s", text.c_str()), text.substr(0, 4095));
+    // Formatted within the buffer: the whole field would take gigabytes.
+    EXPECT_EQ(Message(L"%1500000000d", 5), std::wstring(4095, L' '));
+    EXPECT_EQ(Message(L"%-1500000000c", L'c'), L'c' + std::wstring(4094, L' '));
 }

@@ -42,13 +42,13 @@ std::vector<std::wstring> NewTraceLines()
     return traceLogSeen = log.size(), lines;
 }
 
-// The trace session c:\keltrace\http_tests.log while the tests run; c:\keltrace is left as found.
+// The trace session c:\keltrace\http_tests.log while the tests run.
 class TraceSession : public testing::Environment
 {
 public:
     void SetUp() override
     {
-        m_created = std::filesystem::create_directory(KelvraTraceTest::kMarker);
+        std::filesystem::create_directory(KelvraTraceTest::kMarker);
         Debug::start(L"http_tests", false, false);
         ASSERT_NE(CLog::_log, nullptr) << "no trace session in c:\\keltrace";
         traceLogSeen = KelvraTraceTest::ReadMarkerFile(L"http_tests.log").size();
@@ -61,12 +61,9 @@ public:
         CLog::_log = nullptr;
         Debug::unlock();
         std::filesystem::remove(KelvraTraceTest::kMarker / L"http_tests.log");
-        if (m_created)
-            std::filesystem::remove(KelvraTraceTest::kMarker);
+        std::error_code inUse; // the folder stays if it holds other files
+        std::filesystem::remove(KelvraTraceTest::kMarker, inUse);
     }
-
-private:
-    bool m_created = false;
 };
 
 // The current user's proxy settings, in the registry value Wine's WinHTTP reads (README): none

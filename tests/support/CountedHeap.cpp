@@ -3,14 +3,6 @@
 #include <cstdlib>
 #include <new>
 
-namespace KelvraTest
-{
-
-std::atomic<long long> liveBlocks{0};
-std::atomic<long long> failCountdown{0};
-
-} // namespace KelvraTest
-
 using KelvraTest::failCountdown;
 using KelvraTest::liveBlocks;
 

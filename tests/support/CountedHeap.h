@@ -7,8 +7,8 @@
 namespace KelvraTest
 {
 
-extern std::atomic<long long> liveBlocks;
+inline std::atomic<long long> liveBlocks{0};
 // Allocations to go before the chosen one, which fails when this reaches 0 from 1; 0: none chosen.
-extern std::atomic<long long> failCountdown;
+inline std::atomic<long long> failCountdown{0};
 
 } // namespace KelvraTest

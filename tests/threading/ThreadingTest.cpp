@@ -18,13 +18,8 @@
 namespace
 {
 
-using KelvraCsLocks::CLock;
-using KelvraCsLocks::CScopeLock;
-using KelvraCsLocks::ICritSec;
-using KelvraCsThread::CAutoBoolean;
-using KelvraCsThread::CGlobalBooleanFx2;
-using KelvraCsThread::CInterlockedBooleanFx2;
-using KelvraCsThread::CThreadWin32;
+using namespace KelvraCsLocks;
+using namespace KelvraCsThread;
 
 // TryLock from another thread (released again at once): what any thread but the holder gets.
 int TryLockElsewhere(CLock& lock)

@@ -1,7 +1,6 @@
-// ExtractPatternGroups, TrimChars and AppendCookies, and the client's header patterns on a block
+// ExtractPatternGroups, and the client's header patterns on a block
 // shaped as WinHTTP reports it: a status line, lines ended by CR LF in the server's case, a blank line.
 #include "http/HeaderPatterns.h"
-#include "http/ResponseText.h"
 #include "http/pattern/PatternExtraction.h"
 #include "http/pattern/RegexException.h"
 
@@ -64,14 +63,4 @@ TEST(ExtractPatternGroups, CollectsGroupZeroOfEveryMatchOnce)
         EXPECT_TRUE(ExtractPatternGroups(pattern, text, results));
         EXPECT_EQ(results, entries) << testing::PrintToString(pattern) << " on " << testing::PrintToString(text);
     }
-}
-
-TEST(CookieText, ValuesTrimmedJoinedWithABlankAndClosedWithASemicolon)
-{
-    EXPECT_EQ(TrimChars(L" \t a;\t ", L" \t"), L"a;");
-    EXPECT_EQ(TrimChars(L"    ", L" "), L"");
-    std::wstring cookies;
-    KelvraHttp::AppendCookies(cookies, {L" a=1; Path=/", L"b=2"});
-    KelvraHttp::AppendCookies(cookies, {L"c=3;"});
-    EXPECT_EQ(cookies, L"a=1; Path=/; b=2;c=3;");
 }
