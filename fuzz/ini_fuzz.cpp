@@ -1,6 +1,5 @@
-// The INI line parser on any file text (wide units as WideText reads them): the handler never
-// sees a name beyond the parser's limits, a line end, or a name or value with white space at an
-// end, and the result is 0 or the number of a line read.
+// The INI line parser on any text (as WideText reads it): the handler never sees a name beyond the
+// limits, a line end, or white space at either end; the result is 0 or the number of a line read.
 #include "FuzzSupport.h"
 #include "config/IniParser.h"
 

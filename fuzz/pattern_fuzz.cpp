@@ -1,7 +1,6 @@
-// The pattern matcher on any pattern and text: the input is the pattern, a NUL, then the text (wide
-// units as WideText reads them). A pattern compiles or gets an error code; a match lies within
-// the text (or one past its end after '$'); extraction gives parts of the text, and throws
-// nothing but CRegexException for a pattern without a group.
+// The matcher on the pattern, a NUL, then the text (as WideText reads them): a pattern compiles or
+// gets an error code; a match lies within the text (or one past its end after '$'); extraction gives
+// parts of the text and throws nothing but CRegexException, for a pattern without a group.
 #include "FuzzSupport.h"
 #include "http/pattern/PatternExtraction.h"
 #include "http/pattern/RegexException.h"
@@ -17,10 +16,9 @@ using KelvraFuzz::Check;
 namespace
 {
 
-// Backtracking may try every way to share the text among the pattern's choices, the documented
-// limit of the matcher: about text^(choices + 1) steps, or (choices + 1)^text once a group or
-// abbreviation is itself repeated. Inputs beyond a fraction of a second are not matched, so that a
-// time-out means a loop that never ends.
+// Backtracking may try every way to share the text among the choices, the matcher's documented
+// limit: about text^(choices + 1) steps, or (choices + 1)^text once a group or abbreviation is
+// repeated. Inputs beyond a fraction of a second are not matched: a time-out is an endless loop.
 bool WithinBacktrackingLimit(const std::wstring& pattern, size_t text)
 {
     double choices = 0;

@@ -61,8 +61,7 @@ template <typename T> std::pair<std::string, T> Gives(const char* text, T result
     return {text, result};
 }
 
-// Stores each text under a key of its own ("" stores nothing) and expects get(reader, key) to give its
-// result.
+// Stores each text under a key of its own ("" stores nothing); get(reader, key) gives its result.
 template <typename T, typename Getter>
 void ExpectConversions(const std::vector<std::pair<std::string, T>>& cases, Getter get)
 {
@@ -157,7 +156,8 @@ TEST(INIReaderLookup, KeyIsSectionDotNameWithAsciiLettersLoweredAndItsFirstNonEm
     const std::array<const wchar_t*, 3> lookups[] = {
         {L"", L"top", L"1"}, {L"s", L"top", L"-"}, {L"S", L"Name", L"one"}, {L"e", L"late", L"given"},
         {L"CAF\u00c9", L"\u00e9T\u00e9", L"2"}, {L"caf\u00e9", L"\u00e9t\u00e9", L"-"}, {L"e", L"kept", L"a"},
-        {L"e", L"filled", L"text"}, {L" spaced ", L"k", L"v"}, {L"spaced", L"k", L"-"}, {L"a", L"b.c", L"section"}};
+        {L"e", L"filled", L"text"}, {L" spaced ", L"k", L"v"}, {L"spaced", L"k", L"-"},
+        {L"a", L"b.c", L"section"}};
     for (const auto& [section, key, value] : lookups)
         EXPECT_EQ(reader.Get(section, key, L"-"), value) << section << "." << key;
 }

@@ -24,9 +24,8 @@ public:
     RecordingWinHttp() : m_previous(KelvraHttp::InstallPlatform(this)) {}
     ~RecordingWinHttp() override { KelvraHttp::InstallPlatform(m_previous); }
 
-    // The calls of op numbered occurrence to occurrence + times - 1 from now fail with error
-    // without reaching the platform, except that a failing receive takes the server's answer all
-    // the same, as WinHTTP does before it asks for a resend. Closes and frees never fail.
+    // Calls occurrence to occurrence + times - 1 of op from now fail with error without reaching the
+    // platform (a failing receive still takes the answer, as WinHTTP does); closes and frees never fail.
     void Fail(const std::wstring& op, DWORD error, int occurrence = 1, int times = 1)
     {
         m_faults.push_back({op, error, m_seen[op] + occurrence, times});

@@ -1,5 +1,4 @@
-// Entry point of every test program: a crash must end the program with a message and an exit
-// code, never with a debugger or an error dialog waiting for someone.
+// Every test program's entry: a crash ends it with a message and an exit code, never a dialog.
 #include <gtest/gtest.h>
 
 #include <windows.h>
@@ -15,7 +14,6 @@ LONG WINAPI ReportCrash(EXCEPTION_POINTERS* info)
     std::fprintf(stderr, "test program crashed: exception 0x%08lx at %p\n",
                  static_cast<unsigned long>(info->ExceptionRecord->ExceptionCode),
                  info->ExceptionRecord->ExceptionAddress);
-    std::fflush(stderr);
     ::TerminateProcess(::GetCurrentProcess(), 3);
     return EXCEPTION_EXECUTE_HANDLER;
 }

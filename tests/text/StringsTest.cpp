@@ -57,8 +57,7 @@ TEST(StringsTrimLeft, RemovesLeadingAsciiWhiteSpaceOnly)
 
 TEST(StringsHexToInt, ReadsUpToEightDigitsFromTheRight)
 {
-    // 0xDEAD: output left untouched; a null output is never written. A full-width digit (U+FF11) is no
-    // hexadecimal digit.
+    // 0xDEAD: output untouched; a null output is never written; U+FF11 (full-width 1) is no digit.
     const std::tuple<const wchar_t*, int, unsigned long> cases[] = {
         {nullptr, 1, 0xDEAD},     {L"", 1, 0xDEAD}, {L"123456789", 2, 0xDEAD}, {L"FFFFFFFF", 1, 0xFFFFFFFF},
         {L"aBcDef", 1, 0xABCDEF}, {L"G1", 4, 1},    {L"0x1F", 4, 31},          {L"\uff11", 4, 0}};

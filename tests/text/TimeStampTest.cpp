@@ -9,8 +9,7 @@ using KelvraTime::StampStyle;
 namespace
 {
 
-// stamp() shows clock's minute in that style, read just before or just after it: the minute may
-// turn in between.
+// stamp() shows clock's minute in that style, read just before or after (the minute may turn).
 void ExpectMinuteOf(void(WINAPI* clock)(LPSYSTEMTIME), StampStyle style, std::wstring (*stamp)())
 {
     SYSTEMTIME before, after;

@@ -1,5 +1,5 @@
-// Log sessions of this test program, and of fresh host processes (TraceChild.exe with Sample.Net.dll)
-// for what a process does once: read the configuration file c:\keltrace\debug, find its own name.
+// Log sessions of this program, and of fresh host processes (TraceChild.exe with Sample.Net.dll) for
+// what a process does once: read c:\keltrace\debug, find its own name.
 #include "KelvraTrace.h"
 
 #include "TraceTestSupport.h"
@@ -48,8 +48,7 @@ void RunChild(const Lines& steps, const std::wstring& program = L"TraceChild.exe
     EXPECT_EQ(::_wspawnv(_P_WAIT, child.c_str(), argv.data()), 0) << steps[0];
 }
 
-// Starts in an empty c:\keltrace (no configuration file for this process: level 0, every module),
-// removed afterwards; a session of this program ends with the test.
+// Each test starts in an empty c:\keltrace (level 0, every module) and ends its session.
 class TraceSession : public testing::Test
 {
 protected:
@@ -202,8 +201,7 @@ TEST_F(TraceSession, ConfigurationReadAtTheFirstLineOfAProcessSessionFiltersBoth
 
 TEST_F(TraceSession, ProcessNameFailuresThrowAndCloseTheFileAtOnce)
 {
-    // The per-process name fails before anything is opened, the fixed one after its file was
-    // opened: closed at once, it opens again (it would deny the second writer).
+    // The per-process name fails before opening, the fixed one after: closed at once, it opens again.
     RunChild({"start:1:1:net", "start:0:0:net", "start:0:0:net", "trc:lost"}, L"TraceChildNoDot");
     const std::string failure = "Failed to find the dot extension in the process file name\r\n";
     EXPECT_EQ(ReadMarkerFile(L"failures"), failure + failure + failure);

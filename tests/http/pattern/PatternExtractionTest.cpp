@@ -61,6 +61,7 @@ TEST(ExtractPatternGroups, CollectsGroupZeroOfEveryMatchOnce)
     {
         std::vector<std::wstring> results{L"left over"};
         EXPECT_TRUE(ExtractPatternGroups(pattern, text, results));
-        EXPECT_EQ(results, entries) << testing::PrintToString(pattern) << " on " << testing::PrintToString(text);
+        EXPECT_EQ(results, entries) << testing::PrintToString(pattern) << " on "
+                                    << testing::PrintToString(text);
     }
 }

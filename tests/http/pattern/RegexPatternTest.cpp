@@ -1,7 +1,6 @@
-// CRegexPattern, one table per construct, then hostile or odd input: a pattern, a text and the
-// expected match with its captures. Each match runs on a worker thread within a time limit and
-// with a bounded stack, so that a match that never ends or runs away fails its row instead of
-// stalling the program or taking all memory; the worker shares what it uses, as it may outlive the row.
+// CRegexPattern, a table per construct, then hostile input. Each match runs on a worker thread with
+// a time limit and a bounded stack, so that a match that never ends or runs away fails its row, not
+// the program; the worker shares what it uses, as it may outlive the row.
 #include "http/pattern/RegexPattern.h"
 
 #include <gtest/gtest.h>
@@ -19,9 +18,8 @@
 namespace
 {
 
-// A pattern, a text, and the match expected: "none", or where the match starts, ':' and the text
-// matched, then each group's capture in braces, or "-" for a group that took no part
-// ("1:abc", "0:Aab {a} -").
+// A pattern, a text and the match expected: "none", or where it starts, ':' and the text matched,
+// then each group's capture in braces or "-" for a group that took no part ("0:Aab {a} -").
 using MatchRow = std::array<const wchar_t*, 3>;
 
 // Checks each row, and that the matcher stopped within the text (one step past its end after "$").
