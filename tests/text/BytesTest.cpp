@@ -25,7 +25,7 @@ TEST(Bytes, SharersKeepTheBlockUntilTheLastGoes)
     std::optional<Bytes> copy(std::in_place, *original);
     Bytes target(20);
     EXPECT_EQ(liveBlocks, baseline + 2); // the copy allocated nothing
-    target = *copy;                        // the target's own block goes
+    target = *copy;                      // the target's own block goes
     EXPECT_EQ(liveBlocks, baseline + 1);
     original.reset();
     copy.reset();

@@ -38,7 +38,7 @@ public:
 
 TEST(Lock, HoldingIsCountedPerThreadAndInitOfTheHeldSectionOrOfNullKeepsIt)
 {
-    ICritSec* section = new KelvraCsLocks::CCritSec();
+    ICritSec* section = new CCritSec();
     AdoptingLock lock(section);
     lock.Lock();
     lock.Lock();
